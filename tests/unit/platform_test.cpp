@@ -1,0 +1,69 @@
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "platform/platform.h"
+#include "platform/unique_fd.h"
+#include "tests/unit/device_root.h"
+
+namespace fs = std::filesystem;
+
+using PlatformTest = DeviceRootTest;
+
+TEST_F(PlatformTest, PathsNeverLeaveTheRoot) {
+  write_file("/etc/inside", "in");
+  fs::create_symlink("/etc/inside", host_path("/abs_link"));
+  fs::create_symlink("../../../../../../etc/inside", host_path("/up_link"));
+  for (const char* path : {"/abs_link", "/up_link", "/../../etc/inside", "etc/inside"}) {
+    UniqueFd fd(dev_open(path, O_RDONLY));
+    ASSERT_TRUE(fd.ok()) << path;
+    char text[8] = {};
+    ASSERT_EQ(::read(fd.get(), text, sizeof text - 1), 2) << path;
+    EXPECT_STREQ(text, "in") << path;
+  }
+  // A link to the machine's /etc/passwd resolves to the root's (absent) one.
+  fs::create_symlink("/etc/passwd", host_path("/passwd_link"));
+  EXPECT_LT(dev_open("/passwd_link", O_RDONLY), 0);
+}
+
+TEST_F(PlatformTest, UnlinkRemovesTheLinkNotItsTarget) {
+  write_file("/data/keep", "x");
+  fs::create_symlink("/data/keep", host_path("/data/link"));
+  ASSERT_EQ(dev_unlink("/data/link"), 0);
+  EXPECT_TRUE(exists("/data/keep"));
+  EXPECT_FALSE(exists("/data/link"));
+  EXPECT_NE(dev_rmdir("/.."), 0);
+  EXPECT_NE(dev_unlink("/"), 0);
+}
+
+TEST_F(PlatformTest, PropertiesFollowAndroidRules) {
+  char value[PROPERTY_VALUE_MAX];
+  EXPECT_EQ(property_get("persist.sys.none", value, "dflt"), 4);
+  EXPECT_STREQ(value, "dflt");
+  EXPECT_EQ(property_set("persist.sys.x", "hello"), 0);
+  EXPECT_EQ(property_get("persist.sys.x", value, "dflt"), 5);
+  EXPECT_STREQ(value, "hello");
+  EXPECT_EQ(read_file("/dev/__properties__/persist.sys.x"), "hello");
+
+  const std::string longest(91, 'v');
+  EXPECT_EQ(property_set("persist.sys.long", longest.c_str()), 0);
+  EXPECT_EQ(property_set("persist.sys.long", (longest + "v").c_str()), -1);
+  EXPECT_EQ(get_property("persist.sys.long"), longest);
+
+  EXPECT_EQ(property_set("ro.build.x", "1"), 0);
+  EXPECT_EQ(property_set("ro.build.x", "2"), -1);
+  EXPECT_EQ(get_property("ro.build.x"), "1");
+
+  for (const char* bad : {"../escape", "a/b", ".hidden", ""})
+    EXPECT_EQ(property_set(bad, "1"), -1) << bad;
+  EXPECT_FALSE(exists("/dev/escape"));
+}
+
+TEST_F(PlatformTest, ShellHookRecordsInsteadOfRunning) {
+  EXPECT_EQ(platform_system("echo hi > /data/x"), 0);
+  ASSERT_EQ(shell_commands().size(), 1u);
+  EXPECT_EQ(shell_commands()[0], "echo hi > /data/x");
+  EXPECT_FALSE(exists("/data/x"));
+}
