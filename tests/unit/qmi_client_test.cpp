@@ -48,6 +48,8 @@ class QmiClientTest : public DeviceRootTest {
     serial.fd[1] = -1;
     is_uart_flag = 0;
     reset_results();
+    // A sanitizer starts a helper thread with the first thread of the process.
+    std::thread([] {}).join();
     threads_ = thread_count();
   }
   void TearDown() override {
