@@ -32,8 +32,8 @@ service_object_type kro_get_service_object_internal_v01(int idl_major, int idl_m
                                                         int tool_version);
 
 // With no list only counts the services; with a list fills at most *num_entries of them.
-int client_get_service_list(service_object_type service, service_info* list,
-                            unsigned* num_entries, unsigned* num_services);
+int client_get_service_list(service_object_type service, service_info* list, unsigned* num_entries,
+                            unsigned* num_services);
 
 // Opens a client on one service entry, with no indication callback.
 int client_init(const service_info* info, service_object_type service, client_type* client);

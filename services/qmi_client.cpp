@@ -1,11 +1,12 @@
 #include "services/qmi_client.h"
 
+#include <unistd.h>
+
 #include <cerrno>
 #include <condition_variable>
 #include <cstdio>
 #include <cstring>
 #include <mutex>
-#include <unistd.h>
 
 #include "core/log.h"
 #include "core/serial.h"
@@ -20,7 +21,8 @@ static_assert(sizeof return_buffer == 1024 && sizeof oem_buf == 128);
 namespace {
 
 // Logs under the name of the request being served, as each request function would.
-#define QMI_LOG(level, func, fmt, ...) atci_log((level), __LINE__, (func), fmt __VA_OPT__(, ) __VA_ARGS__)
+#define QMI_LOG(level, func, fmt, ...) \
+  atci_log((level), __LINE__, (func), fmt __VA_OPT__(, ) __VA_ARGS__)
 
 // The eight fixed-message requests differ only in these.
 struct FixedMessage {
@@ -31,16 +33,22 @@ struct FixedMessage {
   bool logs_pending;
 };
 
-constexpr FixedMessage kReadNv{"qmi_kro_read_nv_msg", QMI_KRO_READ_NV_INFO_RESP_MSG_V01, false, true, false};
-constexpr FixedMessage kWriteNv{"qmi_kro_write_nv_msg", QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01, true, true, false};
-constexpr FixedMessage kGpsOption{"qmi_kro_gps_option_msg", QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01, true, false, false};
+constexpr FixedMessage kReadNv{"qmi_kro_read_nv_msg", QMI_KRO_READ_NV_INFO_RESP_MSG_V01, false,
+                               true, false};
+constexpr FixedMessage kWriteNv{"qmi_kro_write_nv_msg", QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01, true,
+                                true, false};
+constexpr FixedMessage kGpsOption{"qmi_kro_gps_option_msg", QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01,
+                                  true, false, false};
 constexpr FixedMessage kSetAntenna{"mutuallySwitchForPrimaryAndDiversity",
                                    QMI_KRO_SET_PRIMARY_DIVERSITY_RESP_MSG_V01, true, false, false};
 constexpr FixedMessage kGetAntenna{"getPrimaryAndDiversitymsg",
                                    QMI_KRO_GET_PRIMARY_DIVERSITY_RESP_MSG_V01, true, false, false};
-constexpr FixedMessage kSetStatus{"qmi_set_status", QMI_PEMU_SET_EM_STATUS_RESP_MSG_V01, true, false, true};
-constexpr FixedMessage kSim2{"qmi_switch_sim2_status", QMI_PEMU_SWITCH_SIM2_STATUS_RESP_MSG_V01, true, false, false};
-constexpr FixedMessage kEfs{"qmi_efs_golden_copy", QMI_PEMU_EFS_GOLDEN_COPY_RESP_MSG_V01, true, false, false};
+constexpr FixedMessage kSetStatus{"qmi_set_status", QMI_PEMU_SET_EM_STATUS_RESP_MSG_V01, true,
+                                  false, true};
+constexpr FixedMessage kSim2{"qmi_switch_sim2_status", QMI_PEMU_SWITCH_SIM2_STATUS_RESP_MSG_V01,
+                             true, false, false};
+constexpr FixedMessage kEfs{"qmi_efs_golden_copy", QMI_PEMU_EFS_GOLDEN_COPY_RESP_MSG_V01, true,
+                            false, false};
 
 constexpr unsigned kMaxResponse = [] {
   unsigned max = 0;
@@ -59,7 +67,8 @@ constexpr unsigned kMaxServiceEntries = 8;
 
 unsigned as_hex(const void* p) { return static_cast<unsigned>(reinterpret_cast<uintptr_t>(p)); }
 
-int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* txn, const void* req) {
+int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* txn,
+               const void* req) {
   qmi::client_type local_clnt = nullptr;
   qmi::txn_handle local_txn = 0;
   if (clnt == nullptr) clnt = &local_clnt;
@@ -76,8 +85,8 @@ int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* t
     QMI_LOG(LOG_LVL_DEBUG, m.name, "clnt:%0x,txn:%0x,data_req:%0x,data_resp:%0x\n", as_hex(*clnt),
             static_cast<unsigned>(*txn), as_hex(req), as_hex(resp));
   }
-  const int rc = qmi::client_send_msg_async(*clnt, m.id, req, sizes.req, resp, sizes.resp, kro_rx_cb,
-                                            kFixedCallbackData, txn);
+  const int rc = qmi::client_send_msg_async(*clnt, m.id, req, sizes.req, resp, sizes.resp,
+                                            kro_rx_cb, kFixedCallbackData, txn);
   QMI_LOG(LOG_LVL_DEBUG, m.name, "KRO: qmi_client_send_msg_async returned %d\n", rc);
   if (rc != qmi::NO_ERR) {
     QMI_LOG(LOG_LVL_ERR, m.name, "KRO: send_msg_async error: %d\n", rc);
@@ -94,7 +103,8 @@ int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* t
   if (m.logs_pending) QMI_LOG(LOG_LVL_DEBUG, m.name, "&&&&&&&&&&&&&&&&&&&&&& pending_async\n");
 
   const int released = qmi::client_release(*clnt);
-  if (m.logs_release) QMI_LOG(LOG_LVL_DEBUG, m.name, "KRO: qmi_client_release of clnt returned %d\n", released);
+  if (m.logs_release)
+    QMI_LOG(LOG_LVL_DEBUG, m.name, "KRO: qmi_client_release of clnt returned %d\n", released);
   return 0;
 }
 
@@ -113,7 +123,8 @@ int send_and_wait(const char* func, void* req, unsigned req_len, unsigned msg_id
   }
   QMI_LOG(LOG_LVL_DEBUG, func, "qmi_client_send_msg_async");
   qmi::txn_handle txn = 0;
-  rc = qmi::client_send_msg_async(clnt, msg_id, req, req_len, resp, resp_len, qmi_kro_cb_ex, wait, &txn);
+  rc = qmi::client_send_msg_async(clnt, msg_id, req, req_len, resp, resp_len, qmi_kro_cb_ex, wait,
+                                  &txn);
   if (rc != qmi::NO_ERR) {
     QMI_LOG(LOG_LVL_ERR, func, "KRO: send_msg_async error: %d", rc);
     ::sem_destroy(&wait->sem);
@@ -167,60 +178,69 @@ int qmi_kro_clnt_init(qmi::client_type* clnt) {
     while (rc != qmi::NO_ERR) {
       service_up.wait(held);
       rc = qmi::client_get_service_list(service, nullptr, nullptr, &num_services);
-      ATCI_LOGD("KRO: qmi_client_get_service_list() returned %d num_services = %d\n", rc, num_services);
+      ATCI_LOGD("KRO: qmi_client_get_service_list() returned %d num_services = %d\n", rc,
+                num_services);
     }
   }
 
   qmi::service_info info[kMaxServiceEntries] = {};
   unsigned num_entries = num_services < kMaxServiceEntries ? num_services : kMaxServiceEntries;
   rc = qmi::client_get_service_list(service, info, &num_entries, &num_services);
-  ATCI_LOGD("KRO: qmi_client_get_service_list() returned %d num_entries = %d num_services = %d\n", rc,
-            num_entries, num_services);
+  ATCI_LOGD("KRO: qmi_client_get_service_list() returned %d num_entries = %d num_services = %d\n",
+            rc, num_entries, num_services);
 
   rc = qmi::client_init(&info[0], service, clnt);
   const int32_t* a = info[0].word;
   const int32_t* b = info[1].word;
-  ATCI_LOGD("info[0]:%d,%d,%d,%d,%d, info[1]:%d,%d,%d,%d,%d\n", a[0], a[1], a[2], a[3], a[4], b[0], b[1],
-            b[2], b[3], b[4]);
+  ATCI_LOGD("info[0]:%d,%d,%d,%d,%d, info[1]:%d,%d,%d,%d,%d\n", a[0], a[1], a[2], a[3], a[4], b[0],
+            b[1], b[2], b[3], b[4]);
   ATCI_LOGD("KRO: qmi_client_init returned %d\n", rc);
   return rc;
 }
 
-int qmi_kro_read_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_read_nv_info_req_msg_v01* req) {
+int qmi_kro_read_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
+                        const kro_read_nv_info_req_msg_v01* req) {
   return send_fixed(kReadNv, clnt, txn, req);
 }
-int qmi_kro_write_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_write_nv_info_req_msg_v01* req) {
+int qmi_kro_write_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
+                         const kro_write_nv_info_req_msg_v01* req) {
   return send_fixed(kWriteNv, clnt, txn, req);
 }
-int qmi_kro_gps_option_msg(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_gps_option_req_msg_v01* req) {
+int qmi_kro_gps_option_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
+                           const kro_gps_option_req_msg_v01* req) {
   return send_fixed(kGpsOption, clnt, txn, req);
 }
-int mutuallySwitchForPrimaryAndDiversity(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
+int mutuallySwitchForPrimaryAndDiversity(qmi::client_type* clnt, qmi::txn_handle* txn,
+                                         const kro_int_req_msg_v01* req) {
   return send_fixed(kSetAntenna, clnt, txn, req);
 }
-int getPrimaryAndDiversitymsg(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
+int getPrimaryAndDiversitymsg(qmi::client_type* clnt, qmi::txn_handle* txn,
+                              const kro_int_req_msg_v01* req) {
   return send_fixed(kGetAntenna, clnt, txn, req);
 }
 int qmi_set_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
   return send_fixed(kSetStatus, clnt, txn, req);
 }
-int qmi_switch_sim2_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
+int qmi_switch_sim2_status(qmi::client_type* clnt, qmi::txn_handle* txn,
+                           const kro_int_req_msg_v01* req) {
   return send_fixed(kSim2, clnt, txn, req);
 }
-int qmi_efs_golden_copy(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
+int qmi_efs_golden_copy(qmi::client_type* clnt, qmi::txn_handle* txn,
+                        const kro_int_req_msg_v01* req) {
   return send_fixed(kEfs, clnt, txn, req);
 }
 
-int qmi_kro_read_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* resp, unsigned resp_len,
-                           qmi_kro_wait_record* wait) {
+int qmi_kro_read_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* resp,
+                           unsigned resp_len, qmi_kro_wait_record* wait) {
   return send_and_wait(__func__, req, req_len, msg_id, resp, resp_len, wait);
 }
-int qmi_kro_write_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* resp, unsigned resp_len,
-                            qmi_kro_wait_record* wait) {
+int qmi_kro_write_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* resp,
+                            unsigned resp_len, qmi_kro_wait_record* wait) {
   return send_and_wait(__func__, req, req_len, msg_id, resp, resp_len, wait);
 }
 
-void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len, void*, int transp_err) {
+void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len, void*,
+               int transp_err) {
   std::memset(return_buffer, 0, sizeof return_buffer);
   qmi_flag = transp_err;
   ATCI_LOGD("qmi_flag = %d\n", qmi_flag);
@@ -243,7 +263,8 @@ void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len,
       break;
     case QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01:
       ATCI_LOGD("=====QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01 \n");
-      if (const auto* r = response_as<kro_gps_option_resp_msg_v01>(resp, resp_len); r && r->buffer_valid != 0)
+      if (const auto* r = response_as<kro_gps_option_resp_msg_v01>(resp, resp_len);
+          r && r->buffer_valid != 0)
         writeDataToSerial(r->buffer, static_cast<int>(strnlen(r->buffer, sizeof r->buffer)));
       break;
     case QMI_KRO_SET_FORMAT_RESP_MSG_V01:
@@ -253,7 +274,8 @@ void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len,
       ATCI_LOGD("====setPrimaryAndDiversity \n");
       break;
     case QMI_KRO_GET_PRIMARY_DIVERSITY_RESP_MSG_V01:
-      if (const auto* r = response_as<kro_get_primary_diversity_resp_msg_v01>(resp, resp_len); r && r->buffer_valid == 1)
+      if (const auto* r = response_as<kro_get_primary_diversity_resp_msg_v01>(resp, resp_len);
+          r && r->buffer_valid == 1)
         set_return_text(r->buffer, sizeof r->buffer);
       break;
     case QMI_PEMU_SET_EM_STATUS_RESP_MSG_V01:
@@ -273,7 +295,8 @@ void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len,
   qmi_pending.fetch_sub(1, std::memory_order_release);
 }
 
-void qmi_kro_cb_ex(qmi::client_type, unsigned msg_id, void*, unsigned, void* cb_data, int transp_err) {
+void qmi_kro_cb_ex(qmi::client_type, unsigned msg_id, void*, unsigned, void* cb_data,
+                   int transp_err) {
   ATCI_LOGD("transp_err: %d, msg_id:%d", transp_err, static_cast<int>(msg_id));
   auto* wait = static_cast<qmi_kro_wait_record*>(cb_data);
   wait->transp_err = transp_err;

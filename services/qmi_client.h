@@ -3,17 +3,18 @@
 // releases the client again.
 #pragma once
 
+#include <semaphore.h>
+
 #include <atomic>
 #include <cstdint>
-#include <semaphore.h>
 
 #include "platform/qmi_transport.h"
 #include "services/qmi_messages.h"
 
 // Results of the last fixed-message response. Read them only after the request returned.
-extern int32_t qmi_flag;            // its transport error
-extern char return_buffer[1024];    // its text, cleared by every response
-extern int32_t oem_buf[32];         // OEM block of the last NV read that carried one
+extern int32_t qmi_flag;                  // its transport error
+extern char return_buffer[1024];          // its text, cleared by every response
+extern int32_t oem_buf[32];               // OEM block of the last NV read that carried one
 extern std::atomic<int32_t> qmi_pending;  // requests sent and not yet answered
 
 // The semaphore variants' wait record.
@@ -54,7 +55,7 @@ int qmi_kro_write_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* 
                             unsigned resp_len, qmi_kro_wait_record* wait);
 
 // Response callbacks, run on the transport's thread.
-void kro_rx_cb(qmi::client_type clnt, unsigned msg_id, void* resp, unsigned resp_len,
-               void* cb_data, int transp_err);
+void kro_rx_cb(qmi::client_type clnt, unsigned msg_id, void* resp, unsigned resp_len, void* cb_data,
+               int transp_err);
 void qmi_kro_cb_ex(qmi::client_type clnt, unsigned msg_id, void* resp, unsigned resp_len,
                    void* cb_data, int transp_err);

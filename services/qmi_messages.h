@@ -76,7 +76,8 @@ struct kro_get_primary_diversity_resp_msg_v01 {
 using kro_status_resp_msg_v01 = qmi_response_type_v01;
 
 #define QMI_LAYOUT(type, size) static_assert(sizeof(type) == (size), #type)
-#define QMI_FIELD(type, field, offset) static_assert(offsetof(type, field) == (offset), #type "." #field)
+#define QMI_FIELD(type, field, offset) \
+  static_assert(offsetof(type, field) == (offset), #type "." #field)
 
 QMI_LAYOUT(qmi_response_type_v01, 8);
 QMI_FIELD(qmi_response_type_v01, result, 0);

@@ -2,6 +2,10 @@
 // /.emu/modem/, read afresh at every request so it can be changed between commands
 // (docs/emulator.md). Each client has one worker thread that answers its requests in order
 // and calls back from there, as the vendor library does from its own thread.
+#include <fcntl.h>
+#include <pthread.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <array>
 #include <charconv>
@@ -9,13 +13,10 @@
 #include <cstdio>
 #include <cstring>
 #include <deque>
-#include <fcntl.h>
 #include <mutex>
 #include <new>
-#include <pthread.h>
 #include <string>
 #include <string_view>
-#include <unistd.h>
 
 #include "platform/host/host_root.h"
 #include "platform/platform.h"
@@ -113,7 +114,8 @@ bool write_state(const std::string& path, std::string_view text) {
   const std::string tmp = path.substr(0, slash + 1) + "." + path.substr(slash + 1) + ".tmp";
   {
     UniqueFd fd(dev_open(tmp.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644));
-    if (!fd.ok() || ::write(fd.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) {
+    if (!fd.ok() ||
+        ::write(fd.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) {
       dev_unlink(tmp.c_str());
       return false;
     }
@@ -125,7 +127,8 @@ bool write_state(const std::string& path, std::string_view text) {
 void append_request_log(const std::string& line) {
   if (host_make_dirs("/.emu/modem") != 0) return;
   UniqueFd fd(dev_open("/.emu/modem/requests.log", O_WRONLY | O_CREAT | O_APPEND, 0644));
-  if (fd.ok()) [[maybe_unused]] const ssize_t n = ::write(fd.get(), line.data(), line.size());
+  if (fd.ok()) [[maybe_unused]]
+    const ssize_t n = ::write(fd.get(), line.data(), line.size());
 }
 
 template <typename T>
@@ -142,12 +145,14 @@ std::string describe(const Job& job) {
   switch (job.msg_id) {
     case QMI_KRO_READ_NV_INFO_RESP_MSG_V01: {
       const auto r = request_as<kro_read_nv_info_req_msg_v01>(job);
-      line += std::to_string(r.nvItem_id) + " " + std::to_string(r.option[0]) + "," + std::to_string(r.option[1]);
+      line += std::to_string(r.nvItem_id) + " " + std::to_string(r.option[0]) + "," +
+              std::to_string(r.option[1]);
       break;
     }
     case QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01: {
       const auto r = request_as<kro_write_nv_info_req_msg_v01>(job);
-      line += std::to_string(r.nvItem_id) + " " + std::to_string(r.option[0]) + "," + std::to_string(r.option[1]) + " ";
+      line += std::to_string(r.nvItem_id) + " " + std::to_string(r.option[0]) + "," +
+              std::to_string(r.option[1]) + " ";
       for (char c : std::string_view(r.buffer, strnlen(r.buffer, sizeof r.buffer))) {
         if (c == '\n')
           line += "\\n";
@@ -206,7 +211,8 @@ void answer(const Job& job) {
     case QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01: {
       auto& r = *static_cast<kro_gps_option_resp_msg_v01*>(resp);
       const auto option = request_as<kro_gps_option_req_msg_v01>(job).option;
-      r.buffer_valid = text_answer("/.emu/modem/gps/" + std::to_string(option), r.buffer, sizeof r.buffer);
+      r.buffer_valid =
+          text_answer("/.emu/modem/gps/" + std::to_string(option), r.buffer, sizeof r.buffer);
       break;
     }
     case QMI_KRO_GET_PRIMARY_DIVERSITY_RESP_MSG_V01: {
@@ -317,7 +323,8 @@ int client_send_msg_async(client_type client, unsigned msg_id, const void* req, 
   if (const int32_t error = switch_value("send_error"); error != 0) return error;
   // What the message's encoder would refuse: an unknown id, or buffers short of its layout.
   const QmiMessageSizes sizes = qmi_kro_sizes_of(msg_id);
-  if (sizes.resp == 0 || req == nullptr || resp == nullptr || req_len < sizes.req || resp_len < sizes.resp)
+  if (sizes.resp == 0 || req == nullptr || resp == nullptr || req_len < sizes.req ||
+      resp_len < sizes.resp)
     return INTERNAL_ERR;
   Job job{msg_id, {}, resp, resp_len, cb, cb_data};
   std::memcpy(job.req.data(), req, sizes.req);
