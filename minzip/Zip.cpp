@@ -294,6 +294,7 @@ struct CopyTarget {
 
 bool copy_out(CopyTarget* target, const unsigned char* data, size_t length) {
   if (length > target->remaining) return false;
+  if (length == 0) return true;  // an empty entry may come with no buffer at all
   std::memcpy(target->next, data, length);
   target->next += length;
   target->remaining -= length;
