@@ -140,10 +140,12 @@ int compare_names(const ZipEntry& a, const char* name, uint32_t length) {
 }
 
 // Opens a gap in the sorted array for `name` after any equal names, so the central directory
-// order survives among duplicates.
+// order survives among duplicates. Most archives list their names in order already: one
+// comparison with the last record settles those.
 ZipEntry* insert_sorted(ZipEntry* entries, unsigned int count, const char* name, uint32_t length) {
   unsigned int low = 0;
   unsigned int high = count;
+  if (count > 0 && compare_names(entries[count - 1], name, length) <= 0) low = count;
   while (low < high) {
     const unsigned int mid = low + (high - low) / 2;
     if (compare_names(entries[mid], name, length) <= 0) {
