@@ -34,6 +34,11 @@ constexpr size_t kEndLength = 22;
 constexpr size_t kEndEntryCount = 8;
 constexpr size_t kEndDirectoryOffset = 16;
 
+// The last field of each fixed record ends where the record does.
+static_assert(kLocalExtraLength + 2 == kLocalHeaderLength);
+static_assert(kCentralLocalOffset + 4 == kCentralHeaderLength);
+static_assert(kEndDirectoryOffset + 4 + 2 == kEndLength);  // then the comment length
+
 constexpr size_t kMaxNameLength = 4095;
 constexpr size_t kInflateWindow = 32768;
 
