@@ -6,8 +6,8 @@
 #include <string>
 
 #include "core/log.h"
-#include "minzip/SysUtil.h"
-#include "minzip/Zip.h"
+#include "minzip/file_mapper.h"
+#include "minzip/zip_archive.h"
 #include "platform/platform.h"
 
 namespace {

@@ -1,11 +1,11 @@
 // libFuzzer target for the zip reader: open any bytes as an archive and extract every entry.
-// Built by the fuzz test from Zip.cpp alone; not part of the daemon.
+// Built by the fuzz test from zip_archive.cpp alone; not part of the daemon.
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <vector>
 
-#include "minzip/Zip.h"
+#include "minzip/zip_archive.h"
 
 namespace {
 // Declared sizes beyond this are skipped instead of allocated; the reader refuses them anyway.

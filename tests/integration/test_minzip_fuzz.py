@@ -34,7 +34,7 @@ def test_fuzz_zip_reader(tmp_path):
     binary = tmp_path / "zip_fuzz"
     subprocess.run([CLANG, "-std=c++20", "-g", "-O1", "-fsanitize=fuzzer,address,undefined",
                     "-fno-sanitize-recover=undefined", f"-I{REPO}", "-o", str(binary),
-                    str(REPO / "minzip" / "zip_fuzz.cpp"), str(REPO / "minzip" / "Zip.cpp"), "-lz"],
+                    str(REPO / "minzip" / "zip_fuzz.cpp"), str(REPO / "minzip" / "zip_archive.cpp"), "-lz"],
                    check=True, timeout=300)
     corpus = tmp_path / "corpus"
     _seed_corpus(corpus, tmp_path)

@@ -5,8 +5,8 @@
 #include <vector>
 #include <zlib.h>
 
-#include "minzip/SysUtil.h"
-#include "minzip/Zip.h"
+#include "minzip/file_mapper.h"
+#include "minzip/zip_archive.h"
 #include "minzip/app_version.h"
 #include "tests/unit/device_root.h"
 

@@ -6,7 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "minzip/SysUtil.h"
+#include "minzip/file_mapper.h"
 
 inline constexpr uint16_t kZipStored = 0;
 inline constexpr uint16_t kZipDeflated = 8;

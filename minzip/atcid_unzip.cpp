@@ -10,8 +10,8 @@
 #include <memory>
 #include <unistd.h>
 
-#include "minzip/SysUtil.h"
-#include "minzip/Zip.h"
+#include "minzip/file_mapper.h"
+#include "minzip/zip_archive.h"
 #include "platform/unique_fd.h"
 
 namespace {

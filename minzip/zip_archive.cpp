@@ -1,4 +1,4 @@
-#include "minzip/Zip.h"
+#include "minzip/zip_archive.h"
 
 #include <cerrno>
 #include <cstdint>

@@ -1,4 +1,4 @@
-#include "minzip/SysUtil.h"
+#include "minzip/file_mapper.h"
 
 #include <cerrno>
 #include <cstdio>
