@@ -3,6 +3,8 @@
 
 #include <cstdint>
 
+#include "platform/device_services.h"
+
 // Framework requests; the result is never inspected by a handler.
 int sendBroadcastFromAtcid(const char* component, const char* action, const char* extras);
 int startActivityFromAtcid(const char* component, const char* action, const char* extras);
@@ -28,12 +30,5 @@ void MD5_Init(MD5_CTX* context);
 int MD5_Update_File(MD5_CTX* context, const char* path);  // 0 on success
 void MD5_Final(unsigned char digest[16], MD5_CTX* context);
 
-// Sensor self-tests: a 116-byte record, int32 `success` (1 passed) then 32-bit values.
-inline constexpr int SENSOR_RESULT_SIZE = 116;
-struct sensor_test_result {
-  int32_t success;
-  float values[28];
-};
-static_assert(sizeof(sensor_test_result) == SENSOR_RESULT_SIZE);
-int pemu_sensor_factory_test(int test, sensor_test_result* result, int reserved, int argument);
-void show_sensor_test_result(const sensor_test_result* result);
+// Sensor self-tests (`pemu_sensor_factory_test`, `show_sensor_test_result` and their
+// 116-byte `sensor_test_result`) are declared with the other platform services.

@@ -3,6 +3,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 #include "core/command.h"
 
@@ -90,6 +91,14 @@ int update_ulda_nvram(const char* caller, Change&& change) {
   if (read_ulda_nvram(caller, record) != RESULT_OK) return RESULT_ERROR;
   if (!change(record)) return RESULT_ERROR;
   return write_ulda_nvram(caller, record);
+}
+
+// Sets a string field: the whole field cleared, then at most its width copied. A value as
+// long as the field fills it with no terminator.
+template <size_t N>
+void set_ulda_string(char (&field)[N], const char* value) {
+  std::memset(field, 0, N);
+  if (value != nullptr) std::memcpy(field, value, strnlen(value, N));
 }
 
 // The read-back poll of close_adb: re-reads up to five times until adb_flag reads 0.
