@@ -23,6 +23,7 @@ struct QueryCase {
   int status;
   std::string body;
 };
+void PrintTo(const QueryCase& c, std::ostream* os) { *os << c.name; }
 
 std::string quoted(const std::string& value) { return "\r\n\"" + value + "\"\r\n"; }
 
