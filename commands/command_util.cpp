@@ -52,6 +52,12 @@ ssize_t read_file_head(const char* path, char* buf, size_t limit) {
   return static_cast<ssize_t>(count);
 }
 
+bool read_file_value(const char* path, char* buf, size_t limit) {
+  if (read_file_head(path, buf, limit) > 0) return true;
+  ATCI_LOGE("cannot read %s", path);
+  return false;
+}
+
 int read_first_line(const char* path, char* line, size_t size) {
   line[0] = '\0';
   UniqueFile file(dev_fopen(path, "r"));

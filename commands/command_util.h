@@ -35,6 +35,14 @@ bool body_append(char* response, std::string_view piece);
 // Returns the byte count, or -1 when the file cannot be opened or its first read fails.
 ssize_t read_file_head(const char* path, char* buf, size_t limit);
 
+// read_file_head for a value that must be there: the whole buffer but its last byte is the
+// limit. False, and logged, when the file cannot be opened, read, or is empty.
+bool read_file_value(const char* path, char* buf, size_t limit);
+template <size_t N>
+bool read_file_value(const char* path, char (&buf)[N]) {
+  return read_file_value(path, buf, N - 1);
+}
+
 // The first line of a device file as fgets reads it into `size` bytes: at most size - 1
 // characters, its line end included when it fits. 0, or -1 when the file cannot be opened or
 // is empty.

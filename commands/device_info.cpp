@@ -50,8 +50,11 @@ constexpr FileQuery kRearCamera{"AT+JVCCMID=0", "sys/ccm/RearSensorId", kFirstLi
 // `value` holds kMaxQueryRead + 1 bytes. An empty file counts as unreadable.
 bool read_query_value(const FileQuery& query, char* value) {
   static_assert(kFirstLineSize <= kMaxQueryRead && 200 <= kMaxQueryRead);
-  if (query.extract == Extract::kHead) return read_file_head(query.path, value, query.limit) > 0;
-  if (read_first_line(query.path, value, query.limit) != 0) return false;
+  if (query.extract == Extract::kHead) return read_file_value(query.path, value, query.limit);
+  if (read_first_line(query.path, value, query.limit) != 0) {
+    ATCI_LOGE("cannot read %s", query.path);
+    return false;
+  }
   cut_at_line_end(value);
   return true;
 }
@@ -59,10 +62,7 @@ bool read_query_value(const FileQuery& query, char* value) {
 int answer_file_query(const FileQuery& query, const char* cmdline, char* response) {
   if (!line_is(cmdline, query.variant)) return REJECT_COMMAND_LINE(cmdline);
   char value[kMaxQueryRead + 1];
-  if (!read_query_value(query, value)) {
-    ATCI_LOGE("cannot read %s", query.path);
-    return RESULT_ERROR;
-  }
+  if (!read_query_value(query, value)) return RESULT_ERROR;
   return answer_quoted(response, value);
 }
 
@@ -170,10 +170,7 @@ int jvrid_handler(char* cmdline, int, char* response) {
 int jvcpuid_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVCPUID=1")) return REJECT_COMMAND_LINE(cmdline);
   char serial[kMaxQueryRead + 1];
-  if (read_file_head("/proc/sec_serial_num", serial, kMaxQueryRead) < 1) {
-    ATCI_LOGE("cannot read /proc/sec_serial_num");
-    return RESULT_ERROR;
-  }
+  if (!read_file_value("/proc/sec_serial_num", serial)) return RESULT_ERROR;
   const bool hex_prefix = std::strncmp(serial, "0x", 2) == 0;
   return answer_quoted(response, hex_prefix ? serial + 2 : serial);
 }
@@ -181,10 +178,7 @@ int jvcpuid_handler(char* cmdline, int, char* response) {
 int jvseboot_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVSEBOOT=1")) return REJECT_COMMAND_LINE(cmdline);
   char state[41];
-  if (read_file_head("/proc/sec_enable", state, 40) < 1) {
-    ATCI_LOGE("cannot read /proc/sec_enable");
-    return RESULT_ERROR;
-  }
+  if (!read_file_value("/proc/sec_enable", state)) return RESULT_ERROR;
   return result_of(strcasecmp(state, "0x00303030") == 0);
 }
 
@@ -233,10 +227,8 @@ int jvccmid_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, kFrontCamera.variant)) return REJECT_COMMAND_LINE(cmdline);
   char front[kMaxQueryRead + 1];
   char rear[kMaxQueryRead + 1];
-  if (!read_query_value(kFrontCamera, front) || !read_query_value(kRearCamera, rear)) {
-    ATCI_LOGE("cannot read the camera module identities");
+  if (!read_query_value(kFrontCamera, front) || !read_query_value(kRearCamera, rear))
     return RESULT_ERROR;
-  }
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"front:%s\r\nback:%s\"\r\n ", front, rear);
   return RESULT_OK;
 }
@@ -252,10 +244,7 @@ int jvtwst_handler(char* cmdline, int, char* response) {
     return RESULT_ERROR;
   }
   char firmware[11];
-  if (read_file_head("/sys/touchscreen/firmware_version", firmware, 10) < 1) {
-    ATCI_LOGE("cannot read the touch firmware version");
-    return RESULT_ERROR;
-  }
+  if (!read_file_value("/sys/touchscreen/firmware_version", firmware)) return RESULT_ERROR;
   firmware[std::strcspn(firmware, "\n")] = '\0';
   // A cut answer would lose its closing quote: refuse it rather than send it.
   constexpr size_t kAnswerLimit = 100;
@@ -270,10 +259,7 @@ int jvtwst_handler(char* cmdline, int, char* response) {
 int jvdcid_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVDCID=1")) return REJECT_COMMAND_LINE(cmdline);
   char text[257];
-  if (read_file_head("/sys/class/power_supply/cms/power_avg", text, 256) < 1) {
-    ATCI_LOGE("cannot read the battery identity");
-    return RESULT_ERROR;
-  }
+  if (!read_file_value("/sys/class/power_supply/cms/power_avg", text)) return RESULT_ERROR;
   // Zero is the identity of an approved battery.
   const auto value = static_cast<uint32_t>(std::strtoull(text, nullptr, 16));
   return result_of(value == 0);
@@ -282,10 +268,7 @@ int jvdcid_handler(char* cmdline, int, char*) {
 int jvusb_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVUSB=0")) return REJECT_COMMAND_LINE(cmdline);
   char text[6];
-  if (read_file_head("sys/class/power_supply/usb/power_now", text, 5) < 1) {
-    ATCI_LOGE("cannot read the charger port protocol");
-    return RESULT_ERROR;
-  }
+  if (!read_file_value("sys/class/power_supply/usb/power_now", text)) return RESULT_ERROR;
   const long protocol = parse_long(text);
   return answer_quoted_int(response, protocol == 3 ? 2 : protocol == 5 ? 3 : 0);
 }
