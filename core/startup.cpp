@@ -104,6 +104,7 @@ KernelCmdlineFlags scan_kernel_cmdline(char* text) {
   while (*token != '\0') {
     char* space = std::strchr(token, ' ');
     if (space != nullptr) *space = '\0';
+    if (*token == '\0') break;
     ATCI_LOGD("/proc/cmdline :%s", token);
     if (std::strstr(token, "console") != nullptr) {
       const char* value = cut_value(token);

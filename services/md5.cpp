@@ -28,26 +28,39 @@ void store_le32(uint8_t* p, uint32_t v) {
   for (int i = 0; i < 4; ++i) p[i] = static_cast<uint8_t>(v >> (8 * i));
 }
 
+template <int Round>
+inline void step(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint32_t x[16], int i) {
+  uint32_t f;
+  int k;
+  if constexpr (Round == 0) {
+    f = (b & c) | (~b & d);
+    k = i;
+  } else if constexpr (Round == 1) {
+    f = (d & b) | (~d & c);
+    k = (5 * i + 1) % 16;
+  } else if constexpr (Round == 2) {
+    f = b ^ c ^ d;
+    k = (3 * i + 5) % 16;
+  } else {
+    f = c ^ (b | ~d);
+    k = (7 * i) % 16;
+  }
+  const uint32_t rotated = rotl(a + f + kSine[i] + x[k], kShift[Round][i % 4]);
+  a = d;
+  d = c;
+  c = b;
+  b += rotated;
+}
+
 void transform(uint32_t state[4], const uint8_t block[64]) {
   uint32_t x[16];
   for (int i = 0; i < 16; ++i) x[i] = load_le32(block + 4 * i);
   uint32_t a = state[0], b = state[1], c = state[2], d = state[3];
-  for (int i = 0; i < 64; ++i) {
-    const int round = i / 16;
-    uint32_t f;
-    int k;
-    switch (round) {
-      case 0: f = (b & c) | (~b & d); k = i; break;
-      case 1: f = (d & b) | (~d & c); k = (5 * i + 1) % 16; break;
-      case 2: f = b ^ c ^ d; k = (3 * i + 5) % 16; break;
-      default: f = c ^ (b | ~d); k = (7 * i) % 16; break;
-    }
-    const uint32_t rotated = rotl(a + f + kSine[i] + x[k], kShift[round][i % 4]);
-    a = d;
-    d = c;
-    c = b;
-    b += rotated;
-  }
+  // One loop per round keeps the round function out of the inner loop.
+  for (int i = 0; i < 16; ++i) step<0>(a, b, c, d, x, i);
+  for (int i = 16; i < 32; ++i) step<1>(a, b, c, d, x, i);
+  for (int i = 32; i < 48; ++i) step<2>(a, b, c, d, x, i);
+  for (int i = 48; i < 64; ++i) step<3>(a, b, c, d, x, i);
   state[0] += a;
   state[1] += b;
   state[2] += c;

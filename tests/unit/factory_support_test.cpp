@@ -2,7 +2,6 @@
 
 #include <climits>
 #include <cstring>
-#include <functional>
 #include <string>
 #include <vector>
 
@@ -13,88 +12,64 @@ namespace {
 
 class FactorySupportTest : public DeviceRootTest {};
 
-std::string hex(const unsigned char digest[16]) {
-  static constexpr char kDigits[] = "0123456789abcdef";
-  std::string text;
-  for (int i = 0; i < 16; ++i) {
-    text += kDigits[digest[i] >> 4];
-    text += kDigits[digest[i] & 15];
-  }
-  return text;
-}
+using Request = int (*)(const char*, const char*, const char*);
 
-std::string md5_of_text(const std::string& text, size_t piece) {
+std::string md5_hex(const std::string& text, size_t piece) {
   MD5_CTX context;
   MD5_Init(&context);
   for (size_t at = 0; at < text.size(); at += piece)
     md5_update(&context, text.data() + at, std::min(piece, text.size() - at));
   unsigned char digest[16];
   MD5_Final(digest, &context);
-  return hex(digest);
+  char hex[33];
+  for (int i = 0; i < 16; ++i) std::snprintf(hex + 2 * i, 3, "%02x", digest[i]);
+  return hex;
 }
 
 TEST_F(FactorySupportTest, FrameworkRequestsRunOneAmCommandLine) {
+  constexpr char kEm[] = "com.ulda.engineermode";
   struct Case {
-    std::function<int()> request;
+    Request request;
+    const char* component;
+    const char* action;
+    const char* extras;
     const char* command;
   };
   const Case cases[] = {
-      {[] { return sendBroadcastFromAtcid(nullptr, "android.intent.action.RESTART_ATCID", nullptr); },
-       "am broadcast -a android.intent.action.RESTART_ATCID"},
-      {[] { return sendBroadcastFromAtcid(nullptr, "kro.intent.action.KEEP_CREEN_ON", "-e status 2"); },
+      {sendBroadcastFromAtcid, nullptr, "kro.intent.action.KEEP_CREEN_ON", "-e status 2",
        "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 2"},
-      {[] {
-         return sendBroadcastFromAtcid("com.ulda.engineermode/.KeepScreenOnReceiver", "", "--ez state true");
-       },
+      {sendBroadcastFromAtcid, "com.ulda.engineermode/.KeepScreenOnReceiver", "", "--ez state true",
        "am broadcast -n com.ulda.engineermode/.KeepScreenOnReceiver --ez state true"},
-      {[] {
-         return startActivityFromAtcid("com.ulda.engineermode/.ATLcmTest", "android.factorytest.ATLCM", nullptr);
-       },
+      {startActivityFromAtcid, "com.ulda.engineermode/.ATLcmTest", "android.factorytest.ATLCM", nullptr,
        "am start -n com.ulda.engineermode/.ATLcmTest -a android.factorytest.ATLCM"},
-      {[] { return startActivityFromAtcid("com.android.camera/.Camera", nullptr, "-e cameraId front"); },
-       "am start -n com.android.camera/.Camera -e cameraId front"},
-      {[] { return startServiceFromAtcid("com.ulda.engineermode/.StartAtcidService", nullptr, nullptr); },
+      {startServiceFromAtcid, "com.ulda.engineermode/.StartAtcidService", nullptr, nullptr,
        "am startservice -n com.ulda.engineermode/.StartAtcidService"},
-      {[] { return startServiceFromAtcid("com.ulda.engineermode/.S", "a.b", "--ei em 4"); },
-       "am startservice -n com.ulda.engineermode/.S -a a.b --ei em 4"},
-      {[] { return stopActivityFromAtcid("com.ulda.engineermode", nullptr, nullptr); },
-       "am force-stop com.ulda.engineermode"},
-      {[] { return stopActivityFromAtcid("com.android.camera", "ignored", "-e x y"); },
-       "am force-stop com.android.camera"},
+      {stopActivityFromAtcid, kEm, nullptr, nullptr, "am force-stop com.ulda.engineermode"},
       // Station text in the extras: blanks split words, anything else stays inside one word.
-      {[] {
-         return sendBroadcastFromAtcid("com.ulda.engineermode/.ConnWifiReceiver", "kro.intent.action.CONNWIFI",
-                                       "-e ssid A;REBOOT -e pwd (null)");
-       },
+      {sendBroadcastFromAtcid, "com.ulda.engineermode/.ConnWifiReceiver", "kro.intent.action.CONNWIFI",
+       "-e ssid A;REBOOT -e pwd (null)",
        "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver -a kro.intent.action.CONNWIFI "
        "-e ssid 'A;REBOOT' -e pwd '(null)'"},
-      {[] { return sendBroadcastFromAtcid(nullptr, "x", "  --es command\topen\n -e pwd IT'S $(ID) "); },
+      {sendBroadcastFromAtcid, nullptr, "x", "  --es command\topen\n -e pwd IT'S $(ID) ",
        "am broadcast -a x --es command open -e pwd 'IT'\\''S' '$(ID)'"},
-      {[] { return sendBroadcastFromAtcid(nullptr, "a b", nullptr); }, "am broadcast -a 'a b'"},
-      {[] { return killprocess("ptt_socket_app", 1); }, "killall -9 ptt_socket_app"},
-      {[] { return killprocess("ptt_socket_app", 0); }, "killall ptt_socket_app"},
-      {[] { return killprocess("x`y`", 1); }, "killall -9 'x`y`'"},
   };
   for (const Case& c : cases) {
     shell_commands().clear();
-    EXPECT_EQ(c.request(), 0) << c.command;
+    EXPECT_EQ(c.request(c.component, c.action, c.extras), 0) << c.command;
     EXPECT_EQ(shell_commands(), std::vector<std::string>{c.command});
   }
-}
-
-TEST_F(FactorySupportTest, FrameworkRequestsReportShellFailureAndRefuseNothingToRun) {
+  shell_commands().clear();
+  EXPECT_EQ(killprocess("ptt_socket_app", 1), 0);
+  EXPECT_EQ(killprocess("ptt_socket_app", 0), 0);
+  EXPECT_NE(stopActivityFromAtcid(nullptr, nullptr, nullptr), 0);
+  EXPECT_NE(killprocess("", 1), 0);
+  EXPECT_EQ(shell_commands(),
+            (std::vector<std::string>{"killall -9 ptt_socket_app", "killall ptt_socket_app"}));
   shell_action() = [](const std::string&) { return 1 << 8; };
   EXPECT_NE(sendBroadcastFromAtcid(nullptr, "a", nullptr), 0);
-  EXPECT_NE(killprocess("ptt_socket_app", 1), 0);
-  shell_commands().clear();
-  EXPECT_NE(stopActivityFromAtcid(nullptr, nullptr, nullptr), 0);
-  EXPECT_NE(stopActivityFromAtcid("", nullptr, nullptr), 0);
-  EXPECT_NE(killprocess(nullptr, 1), 0);
-  EXPECT_NE(killprocess("", 1), 0);
-  EXPECT_TRUE(shell_commands().empty());
 }
 
-TEST_F(FactorySupportTest, ReadFromFile) {
+TEST_F(FactorySupportTest, ReadFromFileAndWriteInt) {
   make_dir("/data/a_directory");
   struct Case {
     const char* content;  // null: no file
@@ -106,53 +81,34 @@ TEST_F(FactorySupportTest, ReadFromFile) {
   const Case cases[] = {
       {"123\n", "sys/class/block/mmcblk0/size", 100, 4, "123\n"},
       {"abcdef", "/sys/x", 4, 3, "abc"},
-      {"", "/sys/x", 100, 0, ""},
       {"x", "/sys/x", 1, 0, ""},
-      {"x", "/sys/x", 0, -1, nullptr},
+      {"x", "/sys/x", 0, -1, "########"},
       {nullptr, "/sys/missing", 100, -1, ""},
       {nullptr, "/data/a_directory", 100, -1, ""},
-      {nullptr, "../../../etc/hostname", 100, -1, ""},
   };
   for (const Case& c : cases) {
     if (c.content) write_file(c.path, c.content);
-    char buffer[100];
+    char buffer[101];
     std::memset(buffer, '#', sizeof buffer);
     const int result = readFromFile(c.path, buffer, c.size);
     EXPECT_EQ(result < 0 ? -1 : result, c.result) << c.path;
-    if (c.text) {
-      EXPECT_STREQ(buffer, c.text) << c.path;
-    }
-    if (c.size < 100) {
-      EXPECT_EQ(buffer[c.size], '#') << "wrote past the buffer: " << c.path;
-    }
+    EXPECT_EQ(std::string(buffer, std::strlen(c.text)), c.text) << c.path;
+    EXPECT_EQ(buffer[c.size], '#') << "wrote past the buffer: " << c.path;
   }
-  EXPECT_LT(readFromFile(nullptr, nullptr, 100), 0);
-}
 
-TEST_F(FactorySupportTest, WriteInt) {
-  struct Case {
-    int value;
-    const char* text;
-  };
-  const Case cases[] = {{255, "255"}, {0, "0"}, {-5, "-5"}, {INT_MIN, "-2147483648"}};
-  for (const Case& c : cases) {
+  for (const auto& [value, text] : {std::pair{255, "255"}, {0, "0"}, {INT_MIN, "-2147483648"}}) {
     write_file("/sys/class/leds/red/brightness", "1000\n");
-    EXPECT_EQ(write_int("/sys/class/leds/red/brightness", c.value), 0);
-    EXPECT_EQ(read_file("/sys/class/leds/red/brightness"), c.text);
+    EXPECT_EQ(write_int("/sys/class/leds/red/brightness", value), 0);
+    EXPECT_EQ(read_file("/sys/class/leds/red/brightness"), text);
   }
   EXPECT_NE(write_int("/sys/class/leds/none/brightness", 1), 0);
   EXPECT_FALSE(exists("/sys/class/leds/none/brightness"));
-  make_dir("/sys/ext_led");
-  EXPECT_NE(write_int("/sys/ext_led/EXT_FLASH_LED", 1), 0);
-  EXPECT_FALSE(exists("/sys/ext_led/EXT_FLASH_LED"));
 }
 
 TEST_F(FactorySupportTest, SubstringStripsQuotesAndBlanks) {
   const std::pair<const char*, const char*> cases[] = {
-      {"\"ABC123\"", "ABC123"},   {" \"A B\" \r\n", "A B"}, {"PLAIN", "PLAIN"},
-      {"\"OPEN", "OPEN"},         {"CLOSE\"", "CLOSE"},     {"\"\"", ""},
-      {"", ""},                   {"   ", ""},              {"\"IN\"SIDE\"", "IN\"SIDE"},
-      {"\t\"\"X\"\"\t", "X"},
+      {" \"A B\" \r\n", "A B"}, {"PLAIN", "PLAIN"}, {"\"OPEN", "OPEN"},
+      {"\"\"", ""},            {"   ", ""},        {"\"IN\"SIDE\"", "IN\"SIDE"},
   };
   for (const auto& [in, out] : cases) {
     char token[32];
@@ -160,7 +116,6 @@ TEST_F(FactorySupportTest, SubstringStripsQuotesAndBlanks) {
     substring(token);
     EXPECT_STREQ(token, out) << in;
   }
-  substring(nullptr);
 }
 
 TEST_F(FactorySupportTest, Md5MatchesRfc1321AndMd5sum) {
@@ -177,7 +132,7 @@ TEST_F(FactorySupportTest, Md5MatchesRfc1321AndMd5sum) {
   };
   for (const auto& [text, digest] : suite) {
     for (size_t piece : {size_t{1}, size_t{7}, size_t{64}, size_t{1000}})
-      EXPECT_EQ(md5_of_text(text, piece), digest) << text << " in pieces of " << piece;
+      EXPECT_EQ(md5_hex(text, piece), digest) << text << " in pieces of " << piece;
   }
 
   // Reference digest from md5sum over the same bytes; longer than one read chunk.
@@ -189,12 +144,10 @@ TEST_F(FactorySupportTest, Md5MatchesRfc1321AndMd5sum) {
   ASSERT_EQ(MD5_Update_File(&context, "/sdcard/apps.zip"), 0);
   unsigned char digest[16];
   MD5_Final(digest, &context);
-  EXPECT_EQ(hex(digest), "71ea1a2345bc501090ed0f67ced13f5e");
-
-  MD5_Init(&context);
+  const unsigned char expected[16] = {0x71, 0xea, 0x1a, 0x23, 0x45, 0xbc, 0x50, 0x10,
+                                      0x90, 0xed, 0x0f, 0x67, 0xce, 0xd1, 0x3f, 0x5e};
+  EXPECT_EQ(std::memcmp(digest, expected, 16), 0);
   EXPECT_NE(MD5_Update_File(&context, "/sdcard/missing.zip"), 0);
-  make_dir("/sdcard/dir");
-  EXPECT_NE(MD5_Update_File(&context, "/sdcard/dir"), 0);
 }
 
 TEST_F(FactorySupportTest, ServiceStateFromTheEmulatedPhone) {
@@ -204,17 +157,10 @@ TEST_F(FactorySupportTest, ServiceStateFromTheEmulatedPhone) {
 
   write_file("/.emu/factory/check_board", "1\n");
   write_file("/.emu/setupwizard", "2\n");
-  write_file("/.emu/camera", "1");
+  write_file("/.emu/camera", "one");
   EXPECT_STREQ(sendMessage("check_board"), "1");
   EXPECT_EQ(isSetupwizardDisabled(), 2);
-  EXPECT_EQ(checkCameraDeviceConnect(0), 1);
-
-  write_file("/.emu/factory/check_board", "board fault\r\nsecond line");
-  write_file("/.emu/setupwizard", "two");
-  write_file("/.emu/camera", "0x3");
-  EXPECT_STREQ(sendMessage("check_board"), "board fault");
-  EXPECT_EQ(isSetupwizardDisabled(), 0);
-  EXPECT_EQ(checkCameraDeviceConnect(0), 3);
+  EXPECT_EQ(checkCameraDeviceConnect(0), 0);
 
   // A request never names a file outside /.emu/factory/.
   write_file("/.emu/secret", "0");
@@ -223,7 +169,6 @@ TEST_F(FactorySupportTest, ServiceStateFromTheEmulatedPhone) {
     ASSERT_NE(answer, nullptr);
     EXPECT_STREQ(answer, "") << request;
   }
-  EXPECT_STREQ(sendMessage(nullptr), "");
 }
 
 TEST_F(FactorySupportTest, SensorTestResultsFromTheEmulatedPhone) {
@@ -236,16 +181,11 @@ TEST_F(FactorySupportTest, SensorTestResultsFromTheEmulatedPhone) {
       {nullptr, 1, {0, 0, 0, 0}},
       {"success=0\n", 0, {0, 0, 0}},
       {"values=1.5 -2 9.81\n", 1, {1.5f, -2.f, 9.81f, 0}},
-      {"success=1\nvalues=1 2 3 4\n", 1, {1, 2, 3, 4}},
-      {"success=7\r\n", 7, {}},
       {"success=abc\nvalues=1 x 3\n", 0, {1, 0, 0}},
-      {"garbage\nvalues=\n", 1, {0}},
   };
   for (const Case& c : cases) {
-    if (c.config)
-      write_file("/.emu/sensor/48", c.config);
-    else
-      std::filesystem::remove(host_path("/.emu/sensor/48"));
+    std::filesystem::remove(host_path("/.emu/sensor/48"));
+    if (c.config) write_file("/.emu/sensor/48", c.config);
     sensor_test_result result;
     std::memset(&result, 0x5a, sizeof result);
     EXPECT_EQ(pemu_sensor_factory_test(48, &result, 0, 0), 0);
@@ -273,7 +213,6 @@ TEST_F(FactorySupportTest, SensorTestResultsFromTheEmulatedPhone) {
   pemu_sensor_factory_test(51, &guarded.result, 0, 0);
   EXPECT_FLOAT_EQ(guarded.result.values[27], 28.f);
   EXPECT_EQ(guarded.guard, 0x12345678);
-  EXPECT_EQ(pemu_sensor_factory_test(51, nullptr, 0, 0), -1);
 }
 
 }  // namespace

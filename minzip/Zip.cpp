@@ -1,0 +1,406 @@
+#include "minzip/Zip.h"
+
+#include <cerrno>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <zlib.h>
+
+namespace {
+
+constexpr uint32_t kLocalSignature = 0x04034b50;
+constexpr uint32_t kCentralSignature = 0x02014b50;
+constexpr uint32_t kEndSignature = 0x06054b50;
+
+constexpr size_t kLocalHeaderLength = 30;
+constexpr size_t kLocalNameLength = 26;
+constexpr size_t kLocalExtraLength = 28;
+
+constexpr size_t kCentralHeaderLength = 46;
+constexpr size_t kCentralMadeBy = 4;
+constexpr size_t kCentralMethod = 10;
+constexpr size_t kCentralModTime = 12;
+constexpr size_t kCentralCrc = 16;
+constexpr size_t kCentralCompressedSize = 20;
+constexpr size_t kCentralUncompressedSize = 24;
+constexpr size_t kCentralNameLength = 28;
+constexpr size_t kCentralExtraLength = 30;
+constexpr size_t kCentralCommentLength = 32;
+constexpr size_t kCentralExternalAttributes = 38;
+constexpr size_t kCentralLocalOffset = 42;
+
+constexpr size_t kEndLength = 22;
+constexpr size_t kEndEntryCount = 8;
+constexpr size_t kEndDirectoryOffset = 16;
+
+// The last field of each fixed record ends where the record does.
+static_assert(kLocalExtraLength + 2 == kLocalHeaderLength);
+static_assert(kCentralLocalOffset + 4 == kCentralHeaderLength);
+static_assert(kEndDirectoryOffset + 4 + 2 == kEndLength);  // then the comment length
+
+constexpr size_t kMaxNameLength = 4095;
+constexpr size_t kInflateWindow = 32768;
+
+uint16_t get16(const unsigned char* p) { return static_cast<uint16_t>(p[0] | p[1] << 8); }
+uint32_t get32(const unsigned char* p) {
+  return p[0] | p[1] << 8 | p[2] << 16 | static_cast<uint32_t>(p[3]) << 24;
+}
+
+// ---- hash table over the entries ----
+
+ZipEntry* tombstone() { return reinterpret_cast<ZipEntry*>(uintptr_t{0xcbcacccd}); }
+
+bool same_name(const ZipEntry* entry, const char* name, uint32_t length) {
+  return entry->name_length == length && std::memcmp(entry->name, name, length) == 0;
+}
+
+HashTable* hash_create(size_t size) {
+  auto* table = static_cast<HashTable*>(std::calloc(1, sizeof(HashTable)));
+  if (table == nullptr) return nullptr;
+  table->slots = static_cast<HashSlot*>(std::calloc(size, sizeof(HashSlot)));
+  if (table->slots == nullptr) {
+    std::free(table);
+    return nullptr;
+  }
+  table->table_size = static_cast<int>(size);
+  return table;
+}
+
+void hash_free(HashTable* table) {
+  if (table == nullptr) return;
+  std::free(table->slots);
+  std::free(table);
+}
+
+// The slot holding `name`, or the empty slot that ends its probe sequence.
+HashSlot* hash_probe(const HashTable* table, uint32_t hash, const char* name, uint32_t length) {
+  const uint32_t mask = static_cast<uint32_t>(table->table_size) - 1;
+  for (uint32_t i = hash & mask;; i = (i + 1) & mask) {
+    HashSlot* slot = &table->slots[i];
+    if (slot->entry == nullptr) return slot;
+    if (slot->entry != tombstone() && slot->hash == hash && same_name(slot->entry, name, length)) {
+      return slot;
+    }
+  }
+}
+
+void hash_resize(HashTable* table, size_t new_size) {
+  auto* slots = static_cast<HashSlot*>(std::calloc(new_size, sizeof(HashSlot)));
+  if (slots == nullptr) {
+    std::puts("minzip: Dalvik hash resize failure");
+    std::abort();
+  }
+  HashSlot* old = table->slots;
+  const int old_size = table->table_size;
+  table->slots = slots;
+  table->table_size = static_cast<int>(new_size);
+  table->num_dead_entries = 0;
+  for (int i = 0; i < old_size; ++i) {
+    if (old[i].entry == nullptr || old[i].entry == tombstone()) continue;
+    *hash_probe(table, old[i].hash, old[i].entry->name, old[i].entry->name_length) = old[i];
+  }
+  std::free(old);
+}
+
+// Returns the entry already filed under the same name, or `entry` once added.
+ZipEntry* hash_insert(HashTable* table, ZipEntry* entry) {
+  const uint32_t hash = zip_name_hash(entry->name, entry->name_length);
+  HashSlot* slot = hash_probe(table, hash, entry->name, entry->name_length);
+  if (slot->entry != nullptr) return slot->entry;
+  *slot = {hash, entry};
+  ++table->num_entries;
+  if ((table->num_entries + table->num_dead_entries) * 8 > table->table_size * 5) {
+    hash_resize(table, static_cast<size_t>(table->table_size) * 2);
+  }
+  return entry;
+}
+
+// ---- central directory ----
+
+[[noreturn]] void fatal_assert(const char* condition, const char* function, const char* file, int line) {
+  std::fflush(stdout);
+  std::fprintf(stderr, "%s:%d: %s: Assertion `%s' failed.\n", file, line, function, condition);
+  std::abort();
+}
+
+bool valid_name(const unsigned char* name, size_t length) {
+  if (length > kMaxNameLength) {
+    std::printf("minzip: Filename too long (%d chatacters)\n", static_cast<int>(length));
+    return false;
+  }
+  for (size_t i = 0; i < length; ++i) {
+    if (name[i] < 0x20 || name[i] > 0x7e) {
+      std::printf("minzip: Filename contains invalid character '%03o'\n", name[i]);
+      return false;
+    }
+  }
+  return true;
+}
+
+int compare_names(const ZipEntry& a, const char* name, uint32_t length) {
+  const int c = std::strncmp(a.name, name, a.name_length < length ? a.name_length : length);
+  if (c != 0) return c;
+  return a.name_length < length ? -1 : a.name_length > length ? 1 : 0;
+}
+
+// Opens a gap in the sorted array for `name` after any equal names, so the central directory
+// order survives among duplicates. Most archives list their names in order already: one
+// comparison with the last record settles those.
+ZipEntry* insert_sorted(ZipEntry* entries, unsigned int count, const char* name, uint32_t length) {
+  unsigned int low = 0;
+  unsigned int high = count;
+  if (count > 0 && compare_names(entries[count - 1], name, length) <= 0) low = count;
+  while (low < high) {
+    const unsigned int mid = low + (high - low) / 2;
+    if (compare_names(entries[mid], name, length) <= 0) {
+      low = mid + 1;
+    } else {
+      high = mid;
+    }
+  }
+  const unsigned int target = low;
+  if (!(target <= count)) {
+    fatal_assert("target <= i", "parseZipArchive", "bootable/recovery/minzip/Zip", __LINE__);
+  }
+  std::memmove(&entries[target + 1], &entries[target], (count - target) * sizeof(ZipEntry));
+  return &entries[target];
+}
+
+// Fills one record from the central entry at `pos`; false (after saying why) on a bad entry.
+bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* slot_array,
+                         unsigned int filled, size_t* next) {
+  const unsigned char* base = archive->addr;
+  const size_t length = archive->length;
+  const int at = static_cast<int>(pos);
+  if (pos + kCentralHeaderLength > length) {
+    std::printf("minzip: Ran off the end (at %d)\n", at);
+    return false;
+  }
+  const unsigned char* p = base + pos;
+  if (get32(p) != kCentralSignature) {
+    std::printf("minzip: Missed a central dir sig (at %d)\n", at);
+    return false;
+  }
+  const uint32_t name_length = get16(p + kCentralNameLength);
+  const size_t extra_length = get16(p + kCentralExtraLength);
+  const size_t comment_length = get16(p + kCentralCommentLength);
+  const uint32_t local_offset = get32(p + kCentralLocalOffset);
+  const unsigned char* name = p + kCentralHeaderLength;
+  if (pos + kCentralHeaderLength + name_length > length) {
+    std::printf("minzip: Filename ran off the end (at %d)\n", at);
+    return false;
+  }
+  if (!valid_name(name, name_length)) {
+    std::printf("minzip: Invalid filename (at %d)\n", at);
+    return false;
+  }
+
+  const char* text = reinterpret_cast<const char*>(name);
+  ZipEntry* entry = insert_sorted(slot_array, filled, text, name_length);
+  *entry = ZipEntry{};
+  entry->name_length = name_length;
+  entry->name = text;
+  entry->compressed_size = get32(p + kCentralCompressedSize);
+  entry->uncompressed_size = get32(p + kCentralUncompressedSize);
+  entry->method = get16(p + kCentralMethod);
+  entry->mod_time = get32(p + kCentralModTime);
+  entry->crc = get32(p + kCentralCrc);
+  entry->made_by = get16(p + kCentralMadeBy);
+  entry->external_attributes = get32(p + kCentralExternalAttributes);
+  const int host = entry->made_by >> 8;
+  if (host != 0 && host != 3) {
+    std::printf("minzip: Incompatible \"version made by\": 0x%02x (at %d)\n", host, at);
+    return false;
+  }
+
+  uintptr_t local_addr = 0;
+  if (__builtin_add_overflow(reinterpret_cast<uintptr_t>(base), uintptr_t{local_offset}, &local_addr)) {
+    std::puts("minzip: Integer overflow adding in parseZipArchive");
+    return false;
+  }
+  if (size_t{local_offset} + kLocalHeaderLength > length) {
+    std::printf("minzip: Bad offset to local header: %d (at %d)\n", static_cast<int>(local_offset), at);
+    return false;
+  }
+  const unsigned char* local = base + local_offset;
+  if (get32(local) != kLocalSignature) {
+    std::printf("minzip: Missed a local header sig (at %d)\n", at);
+    return false;
+  }
+  const uint64_t data_offset = uint64_t{local_offset} + kLocalHeaderLength +
+                               get16(local + kLocalNameLength) + get16(local + kLocalExtraLength);
+  if (data_offset > UINT32_MAX || data_offset + entry->compressed_size > length) {
+    std::printf("minzip: Data ran off the end (at %d)\n", at);
+    return false;
+  }
+  entry->data_offset = static_cast<uint32_t>(data_offset);
+  *next = pos + kCentralHeaderLength + name_length + extra_length + comment_length;
+  return true;
+}
+
+// Position of the end-of-central-directory record, or 0 when there is none.
+size_t find_end_record(const unsigned char* base, size_t length) {
+  for (size_t pos = length - kEndLength; pos > 0; --pos) {
+    if (get32(base + pos) == kEndSignature) return pos;
+  }
+  return 0;
+}
+
+int parse_archive(ZipArchive* archive) {
+  const unsigned char* base = archive->addr;
+  const size_t length = archive->length;
+  if (length < kEndLength) return EINVAL;
+  const uint32_t first = get32(base);
+  if (first == kEndSignature) {
+    std::puts("minzip: Found Zip archive, but it looks empty");
+    return EINVAL;
+  }
+  if (first != kLocalSignature) return EINVAL;
+  const size_t end = find_end_record(base, length);
+  if (end == 0) {
+    std::puts("minzip: Could not find end-of-central-directory in Zip");
+    return EINVAL;
+  }
+  const unsigned int count = get16(base + end + kEndEntryCount);
+  const uint32_t directory = get32(base + end + kEndDirectoryOffset);
+  if (count == 0 || directory >= length) {
+    std::printf("minzip: Invalid entries=%d offset=%d (len=%zd)\n", static_cast<int>(count),
+                static_cast<int>(directory), static_cast<ssize_t>(length));
+    return EINVAL;
+  }
+
+  archive->entries = static_cast<ZipEntry*>(std::calloc(count, sizeof(ZipEntry)));
+  size_t table_size = 1;
+  while (table_size < count * 8 / 5 + 1) table_size <<= 1;
+  archive->hash = hash_create(table_size);
+  if (archive->entries == nullptr || archive->hash == nullptr) return ENOMEM;
+  archive->num_entries = count;
+
+  size_t pos = directory;
+  for (unsigned int i = 0; i < count; ++i) {
+    if (!parse_central_entry(archive, pos, archive->entries, i, &pos)) return EINVAL;
+  }
+  for (unsigned int i = 0; i < count; ++i) {
+    ZipEntry* entry = &archive->entries[i];
+    if (hash_insert(archive->hash, entry) != entry) {
+      std::printf("minzip: WARNING: duplicate entry '%.*s' in Zip\n",
+                  static_cast<int>(entry->name_length), entry->name);
+    }
+  }
+  return 0;
+}
+
+// ---- extraction ----
+
+// The copy step: takes bytes while the destination has room for them.
+struct CopyTarget {
+  unsigned char* next;
+  size_t remaining;
+};
+
+bool copy_out(CopyTarget* target, const unsigned char* data, size_t length) {
+  if (length > target->remaining) return false;
+  if (length == 0) return true;  // an empty entry may come with no buffer at all
+  std::memcpy(target->next, data, length);
+  target->next += length;
+  target->remaining -= length;
+  return true;
+}
+
+bool inflate_to(const ZipArchive* archive, const ZipEntry* entry, CopyTarget* target) {
+  unsigned char window[kInflateWindow];
+  z_stream zs{};
+  zs.next_in = const_cast<Bytef*>(archive->addr + entry->data_offset);
+  zs.avail_in = entry->compressed_size;
+  zs.next_out = window;
+  zs.avail_out = sizeof window;
+  int zerr = inflateInit2(&zs, -MAX_WBITS);
+  if (zerr != Z_OK) {
+    if (zerr == Z_VERSION_ERROR) {
+      std::printf("minzip: Installed zlib is not compatible with linked version (%s)\n", ZLIB_VERSION);
+    } else {
+      std::printf("minzip: Call to inflateInit2 failed (zerr=%d)\n", zerr);
+    }
+    return false;
+  }
+  bool ok = true;
+  do {
+    zerr = inflate(&zs, Z_NO_FLUSH);
+    if (zerr != Z_OK && zerr != Z_STREAM_END) {
+      std::printf("minzip: zlib inflate call failed (zerr=%d)\n", zerr);
+      ok = false;
+      break;
+    }
+    if (zs.avail_out == 0 || (zerr == Z_STREAM_END && zs.avail_out != sizeof window)) {
+      if (!copy_out(target, window, sizeof window - zs.avail_out)) {
+        std::puts("minzip: Process function elected to fail (in inflate)");
+        ok = false;
+        break;
+      }
+      zs.next_out = window;
+      zs.avail_out = sizeof window;
+    }
+  } while (zerr == Z_OK);
+  if (ok && zs.total_out != entry->uncompressed_size) {
+    std::printf("minzip: Size mismatch on inflated file (%ld vs %ld)\n", static_cast<long>(zs.total_out),
+                static_cast<long>(entry->uncompressed_size));
+    ok = false;
+  }
+  inflateEnd(&zs);
+  return ok;
+}
+
+bool extract_to(const ZipArchive* archive, const ZipEntry* entry, CopyTarget* target) {
+  switch (entry->method) {
+    case kZipStored:
+      // Stored sizes were only checked for the compressed length: keep the copy inside the map.
+      if (size_t{entry->data_offset} + entry->uncompressed_size > archive->length) return false;
+      return copy_out(target, archive->addr + entry->data_offset, entry->uncompressed_size);
+    case kZipDeflated:
+      return inflate_to(archive, entry, target);
+    default:
+      std::printf("minzip: Unsupported compression type %d for entry '%.*s'\n", entry->method,
+                  static_cast<int>(entry->name_length), entry->name);
+      return false;
+  }
+}
+
+}  // namespace
+
+uint32_t zip_name_hash(const char* name, size_t length) {
+  uint32_t hash = 2;
+  for (size_t i = 0; i < length; ++i) hash = hash * 31 + static_cast<unsigned char>(name[i]);
+  return hash;
+}
+
+int zip_open_archive(const MemMapping* map, ZipArchive* archive) {
+  *archive = ZipArchive{};
+  archive->addr = map->addr;
+  archive->length = map->length;
+  const int err = parse_archive(archive);
+  if (err != 0) zip_close_archive(archive);
+  return err;
+}
+
+void zip_close_archive(ZipArchive* archive) {
+  std::free(archive->entries);
+  hash_free(archive->hash);
+  *archive = ZipArchive{};
+}
+
+const ZipEntry* zip_find_entry(const ZipArchive* archive, const char* name) {
+  if (archive->hash == nullptr) return nullptr;
+  const auto length = static_cast<uint32_t>(std::strlen(name));
+  return hash_probe(archive->hash, zip_name_hash(name, length), name, length)->entry;
+}
+
+bool zip_extract_entry_to_buffer(const ZipArchive* archive, const ZipEntry* entry,
+                                 unsigned char* buffer) {
+  CopyTarget target{buffer, entry->uncompressed_size};
+  if (!extract_to(archive, entry, &target) || target.remaining != 0) {
+    std::puts("minzip: Can't extract entry to memory buffer.");
+    return false;
+  }
+  return true;
+}

@@ -1,0 +1,187 @@
+"""The daemon core as a station sees it: start-up modes, line rules and answer framing."""
+
+import os
+import subprocess
+import termios
+import time
+
+import pytest
+
+import emulator
+from conftest import BINARY, BLOCK, TcpPhone, TtyPhone, framed_tcp, framed_tty
+
+# Commands whose rows have no behaviour of their own answer "Not Implement" in every
+# accepted form; they exercise the dispatcher without depending on any command family.
+UNSPECIFIED = b"AT+JVLIFE"
+
+
+@pytest.mark.parametrize("line, answer", [
+    # An unknown name gets the reader's own answer: the upper-cased line, then ERROR.
+    (b"ATI", b"ATI\r\nERROR\r\n"),
+    (b"at+nothere=1", b"AT+NOTHERE=1\r\nERROR\r\n"),
+    # Trailing blanks are trimmed before the lookup.
+    (b"AT+NOTHERE   ", b"AT+NOTHERE\r\nERROR\r\n"),
+    # Known name, unsupported form: echo, empty body, "Not Implement".
+    (UNSPECIFIED + b"?", framed_tty(UNSPECIFIED + b"?", b"", b"Not Implement")),
+    (UNSPECIFIED + b"=?", framed_tty(UNSPECIFIED + b"=?", b"", b"Not Implement")),
+    (b"at+jvlife?x=1", framed_tty(b"AT+JVLIFE?X=1", b"", b"Not Implement")),
+    (UNSPECIFIED + b"=1", framed_tty(UNSPECIFIED + b"=1", b"", b"Not Implement")),
+    # The emergency call is answered OK by the reader itself.
+    (b"atd112;", b"ATD112;\r\nOK\r\n"),
+])
+def test_tty_answers(usb_phone, line, answer):
+    assert usb_phone.command(line) == answer
+
+
+@pytest.mark.parametrize("map_cr, answer", [
+    # A port that maps CR to NL turns CR LF into two lines; the empty second one is dropped.
+    (True, framed_tty(b"AT+JVLIFE", b"", b"Not Implement")),
+    # Without the mapping the CR stays in the line, so the name is not found.
+    (False, b"AT+JVLIFE\r\r\nERROR\r\n"),
+])
+def test_tty_line_ended_by_cr_lf(device_root, map_cr, answer):
+    emulator.prepare_mode(device_root, "usb")
+    phone = TtyPhone(device_root)
+    with open(phone.bridge.device_path, "rb", buffering=0) as port:
+        attrs = termios.tcgetattr(port.fileno())
+        attrs[0] = attrs[0] | termios.ICRNL if map_cr else attrs[0] & ~termios.ICRNL
+        termios.tcsetattr(port.fileno(), termios.TCSANOW, attrs)
+    try:
+        phone.start()
+        assert phone.command(b"AT+JVLIFE", end=b"\r\n") == answer
+    finally:
+        phone.stop()
+
+
+def test_tty_line_rules(usb_phone):
+    # Reads that do not begin with A, T are discarded without an answer.
+    for junk in (b"  AT+JVLIFE", b"A", b"T+JVLIFE", b"hello"):
+        usb_phone.send(junk + b"\n")
+        assert usb_phone.receive(timeout=0.6) == b""
+    # A line of 199 characters is served; the emergency call still works afterwards.
+    line = b"AT+NOTHERE=" + b"X" * 188
+    assert len(line) == 199
+    assert usb_phone.command(line) == line + b"\r\nERROR\r\n"
+    assert usb_phone.command(b"ATD112;") == b"ATD112;\r\nOK\r\n"
+    assert any("am broadcast -a kro.intent.action.AT_EMERG_CALL" in cmd
+               for cmd in usb_phone.shell_log())
+
+
+def test_tty_line_of_200_characters_ends_the_daemon(usb_phone):
+    assert usb_phone.command(b"AT+NOTHERE=" + b"X" * 189) == b"\r\nERROR\r\n"
+    assert usb_phone.wait() == 0
+
+
+def test_tty_end_of_service_command_closes_the_port(usb_phone):
+    # The answer comes first; the next wait on the closed port ends the daemon.
+    assert usb_phone.command(b"AT+JVSSID=0") == framed_tty(b"AT+JVSSID=0", b"", b"Not Implement")
+    assert usb_phone.wait() != 0
+
+
+def test_tty_cable_pulled_and_reopen_fails(usb_phone):
+    usb_phone.bridge.hang_up()
+    assert usb_phone.wait() == 1
+    assert "The process is terminated due to fatal error" in usb_phone.log()
+
+
+def test_tcp_blocks_are_padded_and_paced(tcp_phone):
+    tcp_phone.send(UNSPECIFIED + b"=1")
+    tcp_phone.sock.settimeout(5)
+    data = b""
+    block_arrival = {}
+    while len(data) < 3 * BLOCK:
+        chunk = tcp_phone.sock.recv(3 * BLOCK - len(data))
+        assert chunk, "answer stopped early"
+        block_arrival.setdefault(len(data) // BLOCK, time.monotonic())
+        data += chunk
+    assert data == framed_tcp(UNSPECIFIED + b"=1", b"", b"Not Implement")
+    # Each block follows the one before it after a pause of 100 ms.
+    assert sorted(block_arrival) == [0, 1, 2]
+    assert block_arrival[1] - block_arrival[0] >= 0.09
+    assert block_arrival[2] - block_arrival[1] >= 0.09
+
+
+@pytest.mark.parametrize("line, answer", [
+    (b"ATI", b"ATI\r\nERROR\r\n"),
+    (b"ATD112;", b"ATD112;\r\nOK\r\n"),
+    # The socket has no line end to drop: a CR LF sent by the station stays in the line.
+    (b"ATI\r\n", b"ATI\r\n\r\nERROR\r\n"),
+    (UNSPECIFIED + b"?", framed_tcp(UNSPECIFIED + b"?", b"", b"Not Implement")),
+])
+def test_tcp_answers(tcp_phone, line, answer):
+    assert tcp_phone.command(line) == answer
+
+
+def test_tcp_line_of_200_characters_ends_the_daemon(tcp_phone):
+    tcp_phone.send(b"AT" + b"X" * 198)
+    assert tcp_phone.receive() == b"\r\nERROR\r\n"
+    assert tcp_phone.wait() == 0
+
+
+@pytest.mark.parametrize("cmdline, kroem, expected", [
+    # Console mode and uart2 together choose the UART whatever the property says.
+    ("console=sendAT androidboot.uart=uart2", "2", "uart"),
+    ("androidboot.uart=uart2 console=debugAT", "", "uart"),
+    # uart2 without a console mode, or hidden behind an empty token, is not the UART.
+    ("console=ttyHSL0 androidboot.uart=uart2", "1", "usb"),
+    ("console=sendAT  androidboot.uart=uart2", "1", "usb"),
+    # Only the property's first character chooses the socket.
+    ("console=ttyHSL0", "20", "tcp"),
+    ("console=ttyHSL0", "1", "usb"),
+    ("console=ttyHSL0", "", "none"),
+    ("console=ttyHSL0", "3", "none"),
+])
+def test_port_selection(device_root, cmdline, kroem, expected):
+    emulator.device_cmdline(device_root, cmdline)
+    if kroem:
+        emulator.set_property(device_root, "persist.sys.kroem", kroem)
+    if expected == "none":
+        assert run_daemon(device_root) == 0
+        return
+    if expected == "tcp":
+        phone = TcpPhone(device_root)
+    else:
+        phone = TtyPhone(device_root, expected)
+    try:
+        phone.start()
+        assert phone.command(b"ATI") == b"ATI\r\nERROR\r\n"
+        if expected == "uart":
+            with open(phone.bridge.device_path, "rb", buffering=0) as port:
+                attrs = termios.tcgetattr(port.fileno())
+            assert attrs[4] == termios.B115200 and attrs[5] == termios.B115200
+            assert "cat /proc/kmsg > /data/log.txt&" in phone.shell_log()
+            assert (device_root / "dev/__properties__/persist.sys.is_kro_log").read_text() == "2"
+        elif expected == "usb":
+            with open(phone.bridge.device_path, "rb", buffering=0) as port:
+                attrs = termios.tcgetattr(port.fileno())
+            assert attrs[4] != termios.B115200
+    finally:
+        phone.stop()
+
+
+def run_daemon(root):
+    """Runs the daemon on `root` until it ends by itself; returns its status."""
+    with open(root / ".emu/atcid.log", "ab") as log:
+        return emulator.start_daemon(BINARY, root, log=log).wait(timeout=10)
+
+
+def test_usb_port_that_cannot_open(device_root):
+    emulator.prepare_mode(device_root, "usb")
+    (device_root / "dev/ttyGS0").unlink(missing_ok=True)
+    assert run_daemon(device_root) == 1
+    assert "Could not open serial device :/dev/ttyGS0 and start atci service" in \
+        (device_root / ".emu/atcid.log").read_text()
+
+
+def test_missing_root_is_refused():
+    env = {k: v for k, v in os.environ.items() if k != "ATCID_ROOT"}
+    result = subprocess.run([str(BINARY)], env=env, capture_output=True, timeout=10)
+    assert result.returncode != 0
+    assert b"ATCID_ROOT" in result.stderr
+
+
+def test_shell_runs_isolated_in_the_root(tcp_phone):
+    # The emergency call goes through the phone's own shell and its stand-in for am.
+    assert tcp_phone.command(b"ATD112;") == b"ATD112;\r\nOK\r\n"
+    am_log = (tcp_phone.root / ".emu/am.log").read_text()
+    assert "am broadcast -a kro.intent.action.AT_EMERG_CALL" in am_log
