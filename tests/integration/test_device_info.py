@@ -1,21 +1,17 @@
 """Device information queries through the real daemon, answers compared byte for byte."""
 import pytest
 
-BLOCK = 2048
+from conftest import framed_tcp, framed_tty
 
 
-def framed(phone_kind, line, body, word):
-    """The bytes a station receives for one command."""
-    echo = line + b"\r\n"
-    if phone_kind == "tcp":
-        def block(text):
-            return (text + b"\n").ljust(BLOCK, b"\0")
-        return block(echo) + block(body) + block(word + b"\r\n")
-    return echo + b"\n" + body + b"\n" + b"\r\n" + word + b"\r\n"
+def framed(kind, line, body, word):
+    """The bytes a station receives for one command on that kind of port."""
+    return (framed_tcp if kind == "tcp" else framed_tty)(line, body, word)
 
 
 @pytest.fixture(params=["tcp", "usb"])
 def phone(request):
+    """(kind, phone) for each transport."""
     return request.param, request.getfixturevalue(request.param + "_phone")
 
 

@@ -1,14 +1,7 @@
 """Storage tests through the real daemon: the emulated card, its keep list and the shell."""
 import re
 
-import pytest
-
-from test_device_info import framed
-
-
-@pytest.fixture(params=["tcp", "usb"])
-def phone(request):
-    return request.param, request.getfixturevalue(request.param + "_phone")
+from test_device_info import framed, phone  # noqa: F401 (fixture)
 
 
 def card_tree(card):
