@@ -50,7 +50,6 @@ std::vector<QueryCase> query_cases() {
       {"model", jvmodel_handler, "AT+JVMODEL=0", {}, {{"ro.product.model", "QM0305A"}}, OK, quoted("QM0305A")},
       {"model_prefix", jvmodel_handler, "AT+JVMODEL=0 trailing", {}, {{"ro.product.model", "QM0305A"}}, OK, quoted("QM0305A")},
       {"model_unset", jvmodel_handler, "AT+JVMODEL=0", {}, {}, OK, quoted("")},
-      {"model_other", jvmodel_handler, "AT+JVMODEL=1", {}, {}, ERR, ""},
 
       // Flash size: a relative path, 512-byte sectors in gigabytes.
       {"flash", jvfq_handler, "AT+JVFQ=0", {{"sys/class/block/mmcblk0/size", "30535680\n"}}, {}, OK, quoted("14.56")},
@@ -69,7 +68,6 @@ std::vector<QueryCase> query_cases() {
       {"seboot_fused", jvseboot_handler, "AT+JVSEBOOT=1", {{"/proc/sec_enable", "0x00303030"}}, {}, OK, ""},
       {"seboot_case", jvseboot_handler, "AT+JVSEBOOT=1", {{"/proc/sec_enable", "0X00303030"}}, {}, OK, ""},
       {"seboot_line_end", jvseboot_handler, "AT+JVSEBOOT=1", {{"/proc/sec_enable", "0x00303030\n"}}, {}, ERR, ""},
-      {"seboot_open", jvseboot_handler, "AT+JVSEBOOT=1", {{"/proc/sec_enable", "0x00000000"}}, {}, ERR, ""},
       {"seboot_missing", jvseboot_handler, "AT+JVSEBOOT=1", {}, {}, ERR, ""},
 
       // Processor variant: the loose tests follow the strict ones and still win over later ones.
@@ -89,15 +87,12 @@ std::vector<QueryCase> query_cases() {
       // Raw reads keep the line end; first lines are cut at CR or LF.
       {"mpps", jvmpps_handler, "AT+JVMPPS=0", {{"/sys/devs_list/mpps_value", "cpu--AB\n"}}, {}, OK, quoted("cpu--AB\n")},
       {"mpps_long", jvmpps_handler, "AT+JVMPPS=0", {{"/sys/devs_list/mpps_value", kLong300}}, {}, OK, quoted(kLong300.substr(0, 200))},
-      {"mpps_empty", jvmpps_handler, "AT+JVMPPS=0", {{"/sys/devs_list/mpps_value", ""}}, {}, ERR, ""},
       {"lcm", jvlcmid_handler, "AT+JVLCMID=0", {{"/sys/lcm/lcm_id", "nt35596_tianma\nsecond\n"}}, {}, OK, quoted("nt35596_tianma")},
       {"lcm_crlf", jvlcmid_handler, "AT+JVLCMID=0", {{"/sys/lcm/lcm_id", "r63315\r\n"}}, {}, OK, quoted("r63315")},
       {"lcm_long", jvlcmid_handler, "AT+JVLCMID=0", {{"/sys/lcm/lcm_id", kLong300}}, {}, OK, quoted(kLong300.substr(0, 49))},
       {"lcm_empty", jvlcmid_handler, "AT+JVLCMID=0", {{"/sys/lcm/lcm_id", ""}}, {}, ERR, ""},
-      {"lcm_other", jvlcmid_handler, "AT+JVLCMID=1", {{"/sys/lcm/lcm_id", "x\n"}}, {}, ERR, ""},
       {"pid", jvpid_handler, "AT+JVPID=0", {{"/sys/touchscreen/firmware_module_id", "0x3b\n"}}, {}, OK, quoted("0x3b")},
       {"ckic", jvckic_handler, "AT+JVCKIC=0", {{"/sys/touchscreen/touchpanel_devices", "synaptics_s3320\n"}}, {}, OK, quoted("synaptics_")},
-      {"ckic_short", jvckic_handler, "AT+JVCKIC=0", {{"/sys/touchscreen/touchpanel_devices", "gt9xx\n"}}, {}, OK, quoted("gt9xx\n")},
       {"ccmid", jvccmid_handler, "AT+JVCCMID=0", {{"sys/ccm/FrontSensorId", "ov5670\n"}, {"sys/ccm/RearSensorId", "imx214\n"}}, {}, OK, "\r\n\"front:ov5670\r\nback:imx214\"\r\n "},
       {"ccmid_no_rear", jvccmid_handler, "AT+JVCCMID=0", {{"sys/ccm/FrontSensorId", "ov5670\n"}}, {}, ERR, ""},
 
@@ -112,12 +107,10 @@ std::vector<QueryCase> query_cases() {
       {"dcid_zero", jvdcid_handler, "AT+JVDCID=1", {{"/sys/class/power_supply/cms/power_avg", "0\n"}}, {}, OK, ""},
       {"dcid_1a", jvdcid_handler, "AT+JVDCID=1", {{"/sys/class/power_supply/cms/power_avg", "1a\n"}}, {}, ERR, ""},
       {"dcid_high_bits", jvdcid_handler, "AT+JVDCID=1", {{"/sys/class/power_supply/cms/power_avg", "0x100000000"}}, {}, OK, ""},
-      {"dcid_missing", jvdcid_handler, "AT+JVDCID=1", {}, {}, ERR, ""},
 
       {"usb2", jvusb_handler, "AT+JVUSB=0", {{"sys/class/power_supply/usb/power_now", "3\n"}}, {}, OK, quoted("2")},
       {"usb3", jvusb_handler, "AT+JVUSB=0", {{"sys/class/power_supply/usb/power_now", "5\n"}}, {}, OK, quoted("3")},
       {"usb_other", jvusb_handler, "AT+JVUSB=0", {{"sys/class/power_supply/usb/power_now", "4\n"}}, {}, OK, quoted("0")},
-      {"usb_missing", jvusb_handler, "AT+JVUSB=0", {}, {}, ERR, ""},
 
       // SIM presence: positional slots, case-sensitive states.
       {"sim1_ready", jvsim_handler, "AT+JVSIM=1", {}, {{"gsm.sim.state", "READY"}}, OK, ""},
@@ -145,18 +138,15 @@ std::vector<QueryCase> query_cases() {
 
       {"hall_no_magnet", jvhall_handler, "AT+JVHALL=1", {{"/sys/class/switch/hall/state", "1\n"}}, {}, ERR, ""},
       {"hall_magnet", jvhall_handler, "AT+JVHALL=1", {{"/sys/class/switch/hall/state", "0\n"}}, {}, OK, ""},
-      {"hall_missing", jvhall_handler, "AT+JVHALL=1", {}, {}, ERR, ""},
 
       {"fp_board_ok", jvzwsb_handler, "AT+JVZWSB=0", {{"/.emu/factory/check_board", "0\n"}}, {}, OK, ""},
       {"fp_board_bad", jvzwsb_handler, "AT+JVZWSB=0", {{"/.emu/factory/check_board", "1\n"}}, {}, ERR, ""},
       {"fp_quality", jvzwsb_handler, "AT+JVZWSB=1", {}, {}, ERR, ""},
       {"fp_vendor", jvzwsb_handler, "AT+JVZWSB=2", {}, {}, OK, quoted("fpc")},
-      {"fp_other", jvzwsb_handler, "AT+JVZWSB=3", {}, {}, ERR, ""},
 
       {"camera_both", jvccm_handler, "AT+JVCCM=1", {{"/.emu/camera", "3\n"}}, {}, OK, ""},
       {"camera_more_bits", jvccm_handler, "AT+JVCCM=1", {{"/.emu/camera", "7\n"}}, {}, OK, ""},
       {"camera_rear_only", jvccm_handler, "AT+JVCCM=1", {{"/.emu/camera", "1\n"}}, {}, ERR, ""},
-      {"camera_other", jvccm_handler, "AT+JVCCM=0", {{"/.emu/camera", "3\n"}}, {}, ERR, ""},
 
       {"zsj", jvzsj_iicrc_handler, "AT+JVZSJ=1", {}, {}, RESULT_NOT_IMPLEMENTED, ""},
       {"iicrc", jvzsj_iicrc_handler, "AT+JVIICRC=0", {}, {}, RESULT_NOT_IMPLEMENTED, ""},
