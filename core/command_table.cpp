@@ -1,6 +1,9 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/device_info.h"
+#include "commands/storage.h"
+
 namespace {
 constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
 }  // namespace
@@ -15,7 +18,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+LCMT", kSetOrAction, pending_family_handler},
     {"AT+OFFL", kSetOrAction, pending_family_handler},
     {"AT+EQSB", kSetOrAction, pending_family_handler},
-    {"AT+TFST", kSetOrAction, pending_family_handler},
+    {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, pending_family_handler},
     {"AT+JVXL", kSetOrAction, pending_family_handler},
     {"AT+ESLP", kSetOrAction, pending_family_handler},
@@ -23,17 +26,17 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVDL", kSetOrAction, pending_family_handler},
     {"AT+JVIQ", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+EDFT", kSetOrAction, pending_family_handler},
-    {"AT+JVTWST", kSetOrAction, pending_family_handler},
-    {"AT+JVSIM", kSetOrAction, pending_family_handler},
-    {"AT+JVSD", kSetOrAction, pending_family_handler},
+    {"AT+JVTWST", kSetOrAction, jvtwst_handler},
+    {"AT+JVSIM", kSetOrAction, jvsim_handler},
+    {"AT+JVSD", kSetOrAction, jvsd_handler},
     {"AT+JVMP", kSetOrAction, pending_family_handler},
     {"AT+JVTR", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVNC", kSetOrAction, pending_family_handler},
     {"AT+JVDLJ", kSetOrAction, pending_family_handler},
-    {"AT+JVTFWR", kSetOrAction, pending_family_handler},
-    {"AT+JVOTG", kSetOrAction, pending_family_handler},
-    {"AT+JVUDWR", kSetOrAction, pending_family_handler},
-    {"AT+JVUDROOM", kSetOrAction, pending_family_handler},
+    {"AT+JVTFWR", kSetOrAction, jvtfwr_handler},
+    {"AT+JVOTG", kSetOrAction, jvotg_handler},
+    {"AT+JVUDWR", kSetOrAction, jvudwr_handler},
+    {"AT+JVUDROOM", kSetOrAction, jvudroom_handler},
     {"AT+JVRDNV", kSetOrAction, pending_family_handler},
     {"AT+JVMD", kSetOrAction, pending_family_handler},
     {"AT+JVCHARGE", kSetOrAction, pending_family_handler},
@@ -42,61 +45,61 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+OMENU", kSetOrAction, pending_family_handler},
     {"AT+JVADB", kSetOrAction, pending_family_handler},
     {"AT+JVDIAG", kSetOrAction, pending_family_handler},
-    {"AT+JVFQ", kSetOrAction, pending_family_handler},
-    {"AT+JVHALL", kSetOrAction, pending_family_handler},
+    {"AT+JVFQ", kSetOrAction, jvfq_handler},
+    {"AT+JVHALL", kSetOrAction, jvhall_handler},
     {"AT+JVTESTMMI", kSetOrAction, pending_family_handler},
     {"AT+JV3G", kSetOrAction, pending_family_handler},
     {"AT+JVOPTR", kSetOrAction, pending_family_handler},
     {"AT+JVUPDATE", kSetOrAction, pending_family_handler},
     {"AT+JVOEM", kSetOrAction, pending_family_handler},
-    {"AT+JVMODEL", kSetOrAction, pending_family_handler},
+    {"AT+JVMODEL", kSetOrAction, jvmodel_handler},
     {"AT+JVLCD", kSetOrAction, pending_family_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVG3G", kSetOrAction, pending_family_handler},
     {"AT+JVSB3G", kSetOrAction, pending_family_handler},
     {"AT+JVSBDT", kSetOrAction, pending_family_handler},
-    {"AT+JVSDCALI", kSetOrAction, pending_family_handler},
-    {"AT+JVUSB", kSetOrAction, pending_family_handler},
+    {"AT+JVSDCALI", kSetOrAction, jvsdcali_handler},
+    {"AT+JVUSB", kSetOrAction, jvusb_handler},
     {"AT+JVSJZLB", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVQXGWBH", kSetOrAction, pending_family_handler},
     {"AT+JVNFC", kSetOrAction, pending_family_handler},
-    {"AT+JVRID", kSetOrAction, pending_family_handler},
+    {"AT+JVRID", kSetOrAction, jvrid_handler},
     {"AT+JVSWXFK", kSetOrAction, pending_family_handler},
-    {"AT+JVLCMID", kSetOrAction, pending_family_handler},
-    {"AT+JVCCMID", kSetOrAction, pending_family_handler},
-    {"AT+JVPID", kSetOrAction, pending_family_handler},
-    {"AT+JVRAM", kSetOrAction, pending_family_handler},
+    {"AT+JVLCMID", kSetOrAction, jvlcmid_handler},
+    {"AT+JVCCMID", kSetOrAction, jvccmid_handler},
+    {"AT+JVPID", kSetOrAction, jvpid_handler},
+    {"AT+JVRAM", kSetOrAction, jvram_handler},
     {"AT+JVRADIO", kSetOrAction, pending_family_handler},
-    {"AT+JVCKIC", kSetOrAction, pending_family_handler},
-    {"AT+JVBBTYPE", kSetOrAction, pending_family_handler},
+    {"AT+JVCKIC", kSetOrAction, jvckic_handler},
+    {"AT+JVBBTYPE", kSetOrAction, jvbbtype_handler},
     {"AT+JVRTALL", kSetOrAction, pending_family_handler},
     {"AT+JVLOG", kSetOrAction, pending_family_handler},
     {"AT+MMICCM", kSetOrAction, pending_family_handler},
     {"AT+MMITW", kSetOrAction, pending_family_handler},
     {"AT+JVSFT", kSetOrAction, pending_family_handler},
-    {"AT+JVDF", kSetOrAction, pending_family_handler},
-    {"AT+JVFN", kSetOrAction, pending_family_handler},
+    {"AT+JVDF", kSetOrAction, jvdf_handler},
+    {"AT+JVFN", kSetOrAction, jvfn_handler},
     {"AT+ZNGF", kSetOrAction, pending_family_handler},
     {"AT+JVSYJM", kSetOrAction, pending_family_handler},
     {"AT+JVSSID", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVSEBOOT", kSetOrAction, pending_family_handler},
-    {"AT+JVCPUID", kSetOrAction, pending_family_handler},
-    {"AT+JVDCID", kSetOrAction, pending_family_handler},
-    {"AT+JVCARD", kSetOrAction, pending_family_handler},
+    {"AT+JVSEBOOT", kSetOrAction, jvseboot_handler},
+    {"AT+JVCPUID", kSetOrAction, jvcpuid_handler},
+    {"AT+JVDCID", kSetOrAction, jvdcid_handler},
+    {"AT+JVCARD", kSetOrAction, jvcard_handler},
     {"AT+JVGMQH", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+UPDATEAPPS", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLC", kSetOrAction, pending_family_handler},
     {"AT+JVRIC", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+SGDJZ", kSetOrAction, pending_family_handler},
-    {"AT+JVCCM", kSetOrAction, pending_family_handler},
+    {"AT+JVCCM", kSetOrAction, jvccm_handler},
     {"AT+ONLINE", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLANGUAGE", kSetOrAction, pending_family_handler},
     {"AT+JVFLIGHT", kSetOrAction, pending_family_handler},
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
-    {"AT+JVZSJ", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVIICRC", kSetOrAction, unspecified_command_handler},  // not specified further
+    {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
+    {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
-    {"AT+JVZWSB", kSetOrAction, pending_family_handler},
+    {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
     {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
     {"AT+JVDW", kSetOrAction, pending_family_handler},
@@ -104,7 +107,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVPROP", kSetOrAction, pending_family_handler},
     {"AT+JVSIMT", kSetOrAction, pending_family_handler},
-    {"AT+JVTS", kSetOrAction, pending_family_handler},
+    {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
     {"AT+EALT", kSetOrAction, pending_family_handler},
     {"AT+EGMR", kSetOrAction, pending_family_handler},
@@ -142,7 +145,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVDISRECHARGE", kSetOrAction, pending_family_handler},
     {"AT+JVZFTX", kSetOrAction, pending_family_handler},
     {"AT+JVMEID", kSetOrAction, pending_family_handler},
-    {"AT+JVMPPS", kSetOrAction, pending_family_handler},
+    {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, pending_family_handler},
     {"AT+JVSYS", kSetOrAction, pending_family_handler},
     {"AT+JVEFS", kSetOrAction, pending_family_handler},
