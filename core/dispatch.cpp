@@ -66,7 +66,10 @@ void writeDataToserialByResponseType(const char* echo, const char* body, int sta
                 result_word(status));
   char answer[kAnswerSize] = {};
   if (!is_socket_transport()) {
-    std::snprintf(answer, sizeof answer, "%s\n%s\n%s", echo, body, result);
+    // Stations have always received the framed answer cut to the buffer.
+    if (std::snprintf(answer, sizeof answer, "%s\n%s\n%s", echo, body, result) >=
+        static_cast<int>(sizeof answer))
+      ATCI_LOGW("answer cut to %d bytes", static_cast<int>(sizeof answer) - 1);
     ATCI_LOGD("========last_rsp:%s", answer);
     writeDataToSerial(answer, static_cast<int>(std::strlen(answer)));
     return;
