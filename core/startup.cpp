@@ -45,23 +45,23 @@ void read_kernel_cmdline(char* text) {
   std::exit(1);
 }
 
+// The port of device name `index` becomes descriptor 0 in both tty modes.
+bool open_port(int index) {
+  serial.fd[0] = open_serial_device(&serial, serial.dev_name[index]);
+  if (serial.fd[0] != -1) return true;
+  ATCI_LOGE("Could not open serial device :%s and start atci service", serial.dev_name[index]);
+  return false;
+}
+
 int serve_usb() {
-  serial.fd[0] = open_serial_device(&serial, serial.dev_name[0]);
-  if (serial.fd[0] == -1) {
-    ATCI_LOGE("Could not open serial device :%s and start atci service", serial.dev_name[0]);
-    return 1;
-  }
+  if (!open_port(0)) return 1;
   ATCI_LOGI("Entry atcid-damon from usb port!");
   readerLoop(&serial);
   return 0;
 }
 
 int serve_uart() {
-  serial.fd[0] = open_serial_device(&serial, serial.dev_name[1]);
-  if (serial.fd[0] == -1) {
-    ATCI_LOGE("Could not open serial device :%s and start atci service", serial.dev_name[1]);
-    return 1;
-  }
+  if (!open_port(1)) return 1;
   ATCI_LOGI("openLog start\r\n");
   platform_system("cat /proc/kmsg > /data/log.txt&");
   platform_system("logcat -v time > /data/adb.txt&");

@@ -28,24 +28,18 @@ class TransportTest : public DeviceRootTest {
     DeviceRootTest::TearDown();
   }
 
-  // Sequenced packets keep each write one read, as a station's sends arrive in practice.
-  void use_socket() {
+  // Sequenced packets keep each write one read, as a station's sends and a canonical tty's
+  // lines arrive in practice.
+  void use_transport(const char* device_name) {
     int pair[2];
     ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, pair), 0);
     initSerialDevice(&serial);
-    std::strcpy(serial.dev_name[0], "socket");
+    std::strcpy(serial.dev_name[0], device_name);
     serial.fd[0] = pair[0];
     station_ = pair[1];
   }
-
-  void use_tty() {
-    int pair[2];
-    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, pair), 0);
-    initSerialDevice(&serial);
-    std::strcpy(serial.dev_name[0], "/dev/ttyGS0");
-    serial.fd[0] = pair[0];
-    station_ = pair[1];
-  }
+  void use_socket() { use_transport("socket"); }
+  void use_tty() { use_transport("/dev/ttyGS0"); }
 
   std::string drain() {
     std::string out;
