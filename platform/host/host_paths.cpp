@@ -1,4 +1,5 @@
 // Device paths of the emulated phone: every path resolves inside $ATCID_ROOT.
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
@@ -186,9 +187,31 @@ int dev_rename(const char* from, const char* to) {
   return ::renameat(from_dir.get(), from_name.c_str(), to_dir.get(), to_name.c_str());
 }
 
+// The emulated storage reports the size of the machine's file system unless /.emu/statfs
+// names another: lines of "PATH BLOCKS", matched against the path exactly as asked. This is
+// how a stand-in tool (vdc) makes a calibrated card report a new size.
+void apply_statfs_override(const char* path, struct statfs* st) {
+  UniqueFile table(dev_fopen("/.emu/statfs", "r"));
+  if (!table) return;
+  char line[512];
+  while (std::fgets(line, sizeof line, table.get()) != nullptr) {
+    std::string_view text(line);
+    const size_t blank = text.find(' ');
+    if (blank == std::string_view::npos || text.substr(0, blank) != path) continue;
+    char* end = nullptr;
+    const unsigned long long blocks = std::strtoull(line + blank + 1, &end, 10);
+    if (end == line + blank + 1) continue;
+    st->f_blocks = blocks;
+    st->f_bfree = std::min<unsigned long long>(st->f_bfree, blocks);
+    st->f_bavail = std::min<unsigned long long>(st->f_bavail, blocks);
+  }
+}
+
 int dev_statfs(const char* path, struct statfs* st) {
   UniqueFd fd(host_resolve(path, O_PATH));
-  return fd.ok() ? ::fstatfs(fd.get(), st) : -1;
+  if (!fd.ok() || ::fstatfs(fd.get(), st) != 0) return -1;
+  apply_statfs_override(path, st);
+  return 0;
 }
 
 ssize_t dev_readlink(const char* path, char* buf, size_t size) {

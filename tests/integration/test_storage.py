@@ -80,3 +80,18 @@ def test_shell_backed_checks(tcp_phone):
     body = answer[2048:4096].rstrip(b"\0")
     assert re.fullmatch(rb'\r\n"[0-9]+\.[0-9]{2},[0-9]+\.[0-9]{3}"\r\n\n', body), body
     assert answer == framed("tcp", b"AT+JVUDROOM=0", body[:-1], b"OK")
+
+
+def test_storage_calibration_through_vdc(tcp_phone):
+    p = tcp_phone
+    assert p.command(b"AT+JVSDCALI=0") == framed("tcp", b"AT+JVSDCALI=0", b'\r\n"0"\r\n', b"OK")
+    before = (p.root / "persist/ulda_nvram").read_bytes()
+    # The emulated vdc makes the card report its calibrated size; the flag is then "X".
+    assert p.command(b"AT+JVSDCALI=1") == framed("tcp", b"AT+JVSDCALI=1", b"", b"OK")
+    after = (p.root / "persist/ulda_nvram").read_bytes()
+    assert after == before[:264] + (88).to_bytes(4, "little") + before[268:]
+    assert p.command(b"AT+JVSDCALI=0") == framed("tcp", b"AT+JVSDCALI=0", b'\r\n"88"\r\n', b"OK")
+    assert "vdc volume calibrate /storage/sdcard0" in (p.root / ".emu/vdc.log").read_text()
+    # A second calibration finds the size unchanged.
+    assert p.command(b"AT+JVSDCALI=1") == framed("tcp", b"AT+JVSDCALI=1", b"", b"ERROR")
+    assert (p.root / "persist/ulda_nvram").read_bytes() == after

@@ -425,3 +425,21 @@ TEST_F(Calibration, FailuresLeaveTheRecordAsItWas) {
 }
 
 }  // namespace
+
+TEST_F(Calibration, ChangedSizeSetsTheFlagAndKeepsEveryOtherByte) {
+  make_dir("/storage/sdcard0");
+  write_file("/persist/ulda_nvram", record());
+  // The calibration tool makes the storage report another size, as vdc does on a phone.
+  shell_action() = [this](const std::string&) {
+    write_file("/.emu/statfs", "/storage/sdcard0 1234\n");
+    return 0;
+  };
+  EXPECT_EQ(call_handler(jvsdcali_handler, "AT+JVSDCALI=1").status, RESULT_OK);
+  std::string expected = record();
+  const int32_t calibrated = 88;
+  std::memcpy(expected.data() + 264, &calibrated, sizeof calibrated);
+  EXPECT_EQ(read_file("/persist/ulda_nvram"), expected);
+  // Calibrating again does not change the size any more: refused, record untouched.
+  EXPECT_EQ(call_handler(jvsdcali_handler, "AT+JVSDCALI=1").status, RESULT_ERROR);
+  EXPECT_EQ(read_file("/persist/ulda_nvram"), expected);
+}
