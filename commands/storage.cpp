@@ -397,16 +397,15 @@ int jvfn_handler(char* cmdline, int, char* response) {
       }
     });
   }
+  // Test leftovers, logs and the image check mark: any of them fails the check.
   static constexpr const char* kLeftovers[] = {
-      "/storage/sdcard0/相机", "/storage/sdcard0/Camera",   "/storage/sdcard0/DCIM",
-      "/storage/sdcard0/factory_test.amr", "/storage/sdcard0/apps.zip",
+      "/storage/sdcard0/相机",         "/storage/sdcard0/Camera",
+      "/storage/sdcard0/DCIM",         "/storage/sdcard0/factory_test.amr",
+      "/storage/sdcard0/apps.zip",     "/storage/sdcard0/krolog",
+      "/storage/sdcard0/mtklog",       "/storage/sdcard0/.sdimg_check",
   };
   for (const char* leftover : kLeftovers)
     if (exists(leftover)) clean = false;
-  static constexpr const char* kForbidden[] = {
-      "/storage/sdcard0/krolog", "/storage/sdcard0/mtklog", "/storage/sdcard0/.sdimg_check"};
-  for (const char* forbidden : kForbidden)
-    if (exists(forbidden)) clean = false;
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%d, %d\"\r\n", dirs, files);
   return result_of(clean);
 }
