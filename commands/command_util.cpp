@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <sys/wait.h>
 #include <strings.h>
 #include <unistd.h>
 
@@ -87,4 +88,13 @@ long parse_long(std::string_view text) {
   long value = 0;
   std::from_chars(text.data(), text.data() + text.size(), value);
   return value;
+}
+
+int run_shell(const char* command) {
+  ATCI_LOGD("%s", command);
+  return platform_system(command);
+}
+
+bool shell_succeeded(int status) {
+  return status != -1 && WIFEXITED(status) && WEXITSTATUS(status) == 0;
 }

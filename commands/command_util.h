@@ -51,6 +51,11 @@ int read_first_line(const char* path, char* line, size_t size);
 // Ends the text at its first CR or LF.
 void cut_at_line_end(char* text);
 
+// Runs a command text exactly as given through the platform shell; returns the wait status.
+int run_shell(const char* command);
+// The shell ran the command and it exited with status 0.
+bool shell_succeeded(int status);
+
 // strtok over a view: skips leading delimiters, returns the next token (empty at the end) and
 // moves `rest` past it.
 std::string_view next_token(std::string_view& rest, std::string_view delimiters);

@@ -202,18 +202,6 @@ bool exists(const char* path) {
   return dev_lstat(path, &st) == 0;
 }
 
-// ---- Shell scratch files ----
-
-// Runs a shell command exactly as given; its output is read from a scratch file afterwards.
-int run_shell(const char* command) {
-  ATCI_LOGD("%s", command);
-  return platform_system(command);
-}
-
-bool shell_succeeded(int status) {
-  return status != -1 && WIFEXITED(status) && WEXITSTATUS(status) == 0;
-}
-
 // ---- Sizes ----
 
 struct StorageSize {
