@@ -32,6 +32,7 @@ const char* result_word(int status) {
 void send_block(char* block, const char* text) {
   std::memset(block, 0, kAnswerSize);
   std::snprintf(block, kAnswerSize, "%s\n", text);
+  const std::lock_guard lock(transport_write_lock);
   [[maybe_unused]] const ssize_t n = ::send(serial.fd[0], block, kAnswerSize, 0);
 }
 

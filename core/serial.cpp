@@ -11,6 +11,7 @@
 #include "platform/platform.h"
 
 SerialDevice serial;
+std::mutex transport_write_lock;
 int32_t is_uart_flag = 0;
 int32_t is_sp = 0;
 
@@ -56,9 +57,13 @@ int open_serial_device(SerialDevice*, const char* path) {
 
 int writeDataToSerial(const char* data, int length) {
   ATCI_LOGD("Enter with data:%.*s:%d", length, data, length);
-  const ssize_t n = is_socket_transport() && is_uart_flag != 1
-                        ? ::send(serial.fd[0], data, length, 0)
-                        : ::write(serial.fd[serial.active_port], data, length);
+  ssize_t n;
+  {
+    const std::lock_guard lock(transport_write_lock);
+    n = is_socket_transport() && is_uart_flag != 1
+            ? ::send(serial.fd[0], data, length, 0)
+            : ::write(serial.fd[serial.active_port], data, length);
+  }
   if (n < length) {
     ATCI_LOGW("Couldn't write all data to the serial port. Wrote only %d bytes with %d",
               static_cast<int>(n), errno);

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <mutex>
 
 inline constexpr int SERIAL_LINE_SIZE = 6145;
 
@@ -24,6 +25,10 @@ void initSerialDevice(SerialDevice* device);
 int open_serial_device(SerialDevice* device, const char* path);
 int writeDataToSerial(const char* data, int length);
 int readDataFromSerial(char* buffer, int length);
+
+// Held for each write to the port (a tty answer, one socket block, one stream line), so a
+// worker's stream line falls between writes, never inside one.
+extern std::mutex transport_write_lock;
 
 // True when the transport is the socket server's connection.
 bool is_socket_transport();
