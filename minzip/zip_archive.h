@@ -11,18 +11,20 @@
 inline constexpr uint16_t kZipStored = 0;
 inline constexpr uint16_t kZipDeflated = 8;
 
+// Pointer first and the two 16-bit fields last: 40 bytes a record instead of 48.
 struct ZipEntry {
-  uint32_t name_length;
   const char* name;  // into the mapping, not NUL-terminated
+  uint32_t name_length;
   uint32_t data_offset;
   uint32_t compressed_size;
   uint32_t uncompressed_size;
-  uint16_t method;
   uint32_t mod_time;
   uint32_t crc;  // kept, never compared
-  uint16_t made_by;
   uint32_t external_attributes;
+  uint16_t method;
+  uint16_t made_by;
 };
+static_assert(sizeof(ZipEntry) == 40 || sizeof(void*) != 8);
 
 struct HashSlot {
   uint32_t hash;
