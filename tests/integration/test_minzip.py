@@ -118,6 +118,22 @@ def test_many_entries_in_random_order_are_all_found(tmp_path):
         assert (got.returncode, got.data) == (1, None), miss
 
 
+def test_directory_of_megabytes_out_of_order_with_duplicates(tmp_path):
+    # Over a megabyte of entry records takes the reader's large-block path; the names listed
+    # last sort first, so the array and the hashes kept beside it both move under the index.
+    names = [f"d/{i:06d}" for i in range(27_000)] + ["b/late", "a/dup", "c/late", "a/dup", "a/dup"]
+    archive = tmp_path / "large.zip"
+    with pytest.warns(UserWarning), zipfile.ZipFile(archive, "w") as zf:
+        for i, name in enumerate(names):
+            zf.writestr(name, f"{i}")
+    got = listing(archive)
+    lines = got.stdout.decode().splitlines()
+    assert lines[:2] == ["minzip: WARNING: duplicate entry 'a/dup' in Zip"] * 2
+    assert [line.split(" ", 8)[8] for line in lines[2:]] == sorted(names)
+    for name, index in (("a/dup", 27_001), ("c/late", 27_002), ("d/000000", 0), ("d/026999", 26_999)):
+        assert Extracted(archive, name).data == str(index).encode(), name
+
+
 def test_duplicate_names_keep_the_first(tmp_path):
     archive = tmp_path / "dup.zip"
     with pytest.warns(UserWarning):
