@@ -77,7 +77,9 @@ struct Figures {
 
 Figures figures(std::vector<long long> samples) {
   std::sort(samples.begin(), samples.end());
-  const auto at = [&](double q) { return samples[static_cast<size_t>(q * (samples.size() - 1))] / 1000.0; };
+  const auto at = [&](double q) {
+    return samples[static_cast<size_t>(q * (samples.size() - 1))] / 1000.0;
+  };
   return {at(0.5), at(0.99)};
 }
 
@@ -116,7 +118,9 @@ int station_main(int count, const std::string& line, const std::string& answer,
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc == 4 && std::strcmp(argv[1], "floor") == 0) return floor_main(argv[2], from_hex(argv[3]));
+  if (argc == 4 && std::strcmp(argv[1], "floor") == 0) {
+    return floor_main(argv[2], from_hex(argv[3]));
+  }
   if (argc >= 7 && std::strcmp(argv[1], "station") == 0) {
     std::vector<int> fds;
     for (int i = 5; i < argc; ++i) fds.push_back(std::atoi(argv[i]));

@@ -35,6 +35,10 @@ int property_set(const char* key, const char* value);
 
 // Writes one finished log line for the Android log. A null tag logs untagged.
 void platform_log_write(int priority, const char* tag, const char* text);
+// The daemon's log lines leave through a writer thread from now on (a host build; the phone's
+// log daemon does that already). Flush writes out every line logged so far.
+void platform_log_in_background();
+void platform_log_flush();
 
 // Runs a command text as system(3) would and returns its wait status.
 int platform_system(const char* command);

@@ -28,6 +28,7 @@ PowerHook g_power_hook = nullptr;
       ::fsync(fd.get());
     }
   }
+  platform_log_flush();
   std::fflush(nullptr);
   _exit(0);
 }

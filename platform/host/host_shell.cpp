@@ -85,6 +85,7 @@ int platform_system(const char* command) {
   if (command == nullptr) return 1;
   if (g_shell_hook != nullptr) return g_shell_hook(command);
   record_command(command);
+  platform_log_flush();  // the command's own output comes after the lines that led to it
   const pid_t pid = ::fork();
   if (pid < 0) return -1;
   if (pid == 0) run_isolated(command);
