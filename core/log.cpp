@@ -41,10 +41,16 @@ void atci_log(int level, int line, const char* func, const char* fmt, ...) {
   int n = call_site(text, sizeof text, line, func);
   if (n < 0) n = 0;
   if (n >= static_cast<int>(sizeof text)) n = sizeof text - 1;
-  va_list args;
-  va_start(args, fmt);
-  std::vsnprintf(text + n, sizeof text - n, fmt, args);
-  va_end(args);
+  if (std::strchr(fmt, '%') == nullptr) {  // a fixed text, as many are: no formatting pass
+    const size_t len = strnlen(fmt, sizeof text - n - 1);
+    std::memcpy(text + n, fmt, len);
+    text[n + len] = '\0';
+  } else {
+    va_list args;
+    va_start(args, fmt);
+    std::vsnprintf(text + n, sizeof text - n, fmt, args);
+    va_end(args);
+  }
   platform_log_write(priority_of(level), kTag, text);
 }
 
