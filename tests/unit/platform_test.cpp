@@ -3,6 +3,8 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <fstream>
+#include <functional>
 
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
@@ -59,6 +61,51 @@ TEST_F(PlatformTest, PropertiesFollowAndroidRules) {
   for (const char* bad : {"../escape", "a/b", ".hidden", ""})
     EXPECT_EQ(property_set(bad, "1"), -1) << bad;
   EXPECT_FALSE(exists("/dev/escape"));
+}
+
+// Values read are kept between reads; every way of changing a property file from outside
+// must still show at the next read.
+TEST_F(PlatformTest, PropertyChangesMadeOutsideShowAtOnce) {
+  make_dir("/dev/__properties__");
+  make_dir("/data");
+  const fs::path dir = host_path("/dev/__properties__");
+  const struct {
+    const char* what;
+    std::function<void()> change;
+    const char* expected;
+  } cases[] = {
+      {"written in place", [&] { write_file("/dev/__properties__/p.x", "2"); }, "2"},
+      {"renamed over", [&] {
+         write_file("/dev/__properties__/.tmp", "3");
+         fs::rename(dir / ".tmp", dir / "p.x");
+       }, "3"},
+      {"removed", [&] { fs::remove(dir / "p.x"); }, "dflt"},
+      {"created", [&] { write_file("/dev/__properties__/p.x", "4"); }, "4"},
+      {"a link's target changed", [&] {
+         fs::remove(dir / "p.x");
+         write_file("/data/target", "5");
+         fs::create_symlink("/data/target", dir / "p.x");
+         get_property("p.x");
+         write_file("/data/target", "6");
+       }, "6"},
+      {"a hard link's other name written", [&] {
+         fs::remove(dir / "p.x");
+         write_file("/data/other", "7");
+         fs::create_hard_link(host_path("/data/other"), dir / "p.x");
+         get_property("p.x");
+         std::ofstream(host_path("/data/other"), std::ios::trunc) << "8";
+       }, "8"},
+  };
+  write_file("/dev/__properties__/p.x", "1");
+  char value[PROPERTY_VALUE_MAX];
+  property_get("p.x", value, "dflt");
+  ASSERT_STREQ(value, "1");
+  for (const auto& c : cases) {
+    property_get("p.x", value, "dflt");  // kept, if it can be
+    c.change();
+    property_get("p.x", value, "dflt");
+    EXPECT_STREQ(value, c.expected) << c.what;
+  }
 }
 
 TEST_F(PlatformTest, ShellHookRecordsInsteadOfRunning) {
