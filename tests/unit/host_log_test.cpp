@@ -8,6 +8,7 @@
 #include <fstream>
 #include <gtest/gtest.h>
 #include <map>
+#include <regex>
 #include <sstream>
 #include <string>
 #include <thread>
@@ -99,6 +100,26 @@ TEST_F(HostLogTest, RepeatsAreFoldedAsWithoutTheWriter) {
   EXPECT_NE(got[2].find("spin b"), std::string::npos);
   EXPECT_EQ(got[3], "(the 98 lines before repeated the two above)");
   EXPECT_NE(got[4].find("after"), std::string::npos);
+}
+
+TEST_F(HostLogTest, LinesKeepTheirLogcatShape) {
+  in_child([] {
+    ATCI_LOGW("short");
+    ATCI_LOGI("%s", std::string(5000, 'x').c_str());
+    atci_log_untagged(LOG_LVL_ERR, "untagged");
+  });
+  std::ifstream in(path_);
+  std::vector<std::string> lines;
+  for (std::string line; std::getline(in, line);) lines.push_back(line);
+  ASSERT_EQ(lines.size(), 3u);
+  const std::string stamp = R"(\d\d-\d\d \d\d:\d\d:\d\d\.\d\d\d [ \d]{4}\d [ \d]{4}\d )";
+  EXPECT_TRUE(std::regex_match(lines[0], std::regex(stamp + R"(W ATCID   : \d+:operator\(\)\(\): short)")))
+      << lines[0];
+  // Cut to 4,095 bytes before its line feed.
+  EXPECT_EQ(lines[1].size(), 4095u);
+  EXPECT_TRUE(std::regex_match(lines[1].substr(0, 60), std::regex(stamp + "I ATCID   : .*"))) << lines[1];
+  EXPECT_EQ(lines[1].back(), 'x');
+  EXPECT_TRUE(std::regex_match(lines[2], std::regex(stamp + "E         : untagged"))) << lines[2];
 }
 
 }  // namespace
