@@ -1,5 +1,5 @@
-"""The emulated phone: a device root made from the template, a harmless shell, pseudo-terminals
-for the serial ports, and the atcid daemon serving on them.
+"""The emulated phone: a device root made from the template, its shell (a static mksh and busybox
+tools), pseudo-terminals for the serial ports, and the atcid daemon serving on them.
 
 Used by the launcher (atcid-emu) and by the integration tests.
 """
@@ -23,11 +23,13 @@ DIRECTORIES = (
     "storage/sdcard1", "system/bin", "system/xbin", "tmp", ".emu",
 )
 
-# Busybox applets installed as the phone's shell tools. Anything that could act on the real
+# Busybox applets installed as the phone's shell tools. The daemon's shell runs in namespaces
+# of its own, so none of them could reach the machine; still, tools that would act on a whole
 # machine (reboot, poweroff, halt, date, hwclock, insmod, rmmod, modprobe, mount, umount,
-# chroot, swapon, ifconfig, ip, route, nsenter, unshare, sync, ...) is deliberately absent.
+# chroot, swapon, ifconfig, ip, route, nsenter, unshare, sync, ...) and busybox's own shells
+# are left out: the phone's tools of those names are stand-in scripts of the template.
 SAFE_APPLETS = (
-    "sh", "ash", "awk", "basename", "cat", "chmod", "cmp", "cp", "cut", "dd", "diff", "dirname",
+    "awk", "basename", "cat", "chmod", "cmp", "cp", "cut", "dd", "diff", "dirname",
     "du", "echo", "env", "expr", "false", "find", "grep", "head", "id", "kill", "killall", "ln",
     "ls", "md5sum", "mkdir", "mktemp", "mv", "od", "pgrep", "pidof", "pkill", "printf", "ps",
     "pwd", "readlink", "realpath", "rm", "rmdir", "sed", "seq", "sleep", "sort", "stat", "tail",
@@ -35,13 +37,24 @@ SAFE_APPLETS = (
 )
 
 BUSYBOX_CANDIDATES = ("/bin/busybox", "/usr/bin/busybox")
+# The phone's shell is mksh; Debian's mksh package has a static build. It finds every command
+# through PATH, so a stand-in script always runs, never a built-in applet of the same name.
+MKSH_CANDIDATES = ("/bin/mksh-static", "/usr/lib/klibc/bin/mksh")
 
 
-def find_busybox():
-    for path in BUSYBOX_CANDIDATES:
+def _first_existing(paths):
+    for path in paths:
         if os.path.exists(path):
             return path
     return None
+
+
+def find_busybox():
+    return _first_existing(BUSYBOX_CANDIDATES)
+
+
+def find_mksh():
+    return _first_existing(MKSH_CANDIDATES)
 
 
 def set_property(root, name, value):
@@ -51,7 +64,7 @@ def set_property(root, name, value):
     path.write_bytes(value.encode() if isinstance(value, str) else value)
 
 
-def make_root(root, busybox=None):
+def make_root(root, busybox=None, mksh=None):
     """Creates a fresh device root at `root` from the template and installs the shell."""
     root = Path(root)
     if root.exists():
@@ -59,22 +72,25 @@ def make_root(root, busybox=None):
     shutil.copytree(TEMPLATE, root, symlinks=True)
     for directory in DIRECTORIES:
         (root / directory).mkdir(parents=True, exist_ok=True)
-    install_shell(root, busybox or find_busybox())
+    install_shell(root, mksh or find_mksh(), busybox or find_busybox())
     return root
 
 
-def install_shell(root, busybox):
-    """Installs a static busybox as /system/bin/busybox with links for the safe applets only."""
-    if busybox is None:
-        return False
+def install_shell(root, mksh, busybox):
+    """Installs the static mksh as /system/bin/sh, and a static busybox as /system/bin/busybox
+    with links for the listed applets that no stand-in of the template already provides."""
     bindir = Path(root) / "system/bin"
+    if mksh is not None:
+        shutil.copy(mksh, bindir / "sh")
+    if busybox is None:
+        return mksh is not None
     shutil.copy2(busybox, bindir / "busybox")
     listed = subprocess.run([busybox, "--list"], capture_output=True, text=True).stdout.split()
     for applet in SAFE_APPLETS:
         link = bindir / applet
-        if applet in listed and not link.exists():
+        if applet in listed and not link.exists() and not link.is_symlink():
             link.symlink_to("busybox")
-    return True
+    return mksh is not None
 
 
 def device_cmdline(root, text):
