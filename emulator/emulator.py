@@ -181,13 +181,49 @@ def prepare_mode(root, mode):
         raise ValueError(f"unknown mode {mode}")
 
 
-def start_daemon(binary, root, port=None, log=None):
+def start_daemon(binary, root, port=None, log=None, listen=None):
     env = {k: v for k, v in os.environ.items() if not k.startswith("ATCID_")}
     env["ATCID_ROOT"] = str(root)
     if port is not None:
         env["ATCID_PORT"] = str(port)
+    if listen is not None:
+        env["ATCID_LISTEN"] = str(listen)
     return subprocess.Popen([str(binary)], env=env, stdin=subprocess.DEVNULL,
                             stdout=log or subprocess.DEVNULL, stderr=log or subprocess.DEVNULL)
+
+
+def power_log_size(root):
+    try:
+        return (Path(root) / ".emu/power.log").stat().st_size
+    except FileNotFoundError:
+        return 0
+
+
+# A daemon that ends sooner than this after its start is started again only after this pause,
+# so one that cannot serve at all is not restarted in a tight loop.
+RESTART_PAUSE = 1.0
+
+
+def run_service(binary, root, log_path, port=None, listen=None, on_start=None, stopping=None):
+    """Runs the daemon on `root` as the phone's init runs its service: whenever it ends on its
+    own it is started again on the same root, so a station can hang up and connect again.
+    Returns the last status once the daemon ended by a power request (.emu/power.log grew
+    while it ran) or once `stopping` (a threading.Event) is set. `on_start` gets each process."""
+    stopping = stopping or threading.Event()
+    while True:
+        before = power_log_size(root)
+        started = time.monotonic()
+        with open(log_path, "ab") as log:
+            proc = start_daemon(binary, root, port=port, log=log, listen=listen)
+        if on_start is not None:
+            on_start(proc)
+        if stopping.is_set():
+            proc.terminate()
+        status = proc.wait()
+        if stopping.is_set() or power_log_size(root) > before:
+            return status
+        if stopping.wait(max(0.0, RESTART_PAUSE - (time.monotonic() - started))):
+            return status
 
 
 def wait_for_log(path, text, proc=None, timeout=10.0):

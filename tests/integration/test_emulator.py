@@ -1,13 +1,18 @@
-"""The emulated phone's shell as command families use it: stand-in tools win over busybox's
-applets, background jobs outlive their call, and the reboot stand-in ends the daemon. The
-emergency call runs `am` through the shell, so each test makes `am` the script it needs."""
+"""The emulated phone as command families and station developers use it: stand-in tools win
+over busybox's applets, background jobs outlive their call, the reboot stand-in ends the
+daemon, and the launcher serves one station after another. The emergency call runs `am`
+through the shell, so tests make `am` the script they need."""
 
 import os
 import select
+import signal
+import socket
 import subprocess
+import sys
 import time
 
 import emulator
+from conftest import BINARY, SOURCE, free_port
 
 EMERGENCY = b"ATD112;"
 
@@ -80,3 +85,39 @@ def test_shell_reboot_ends_the_daemon(tcp_phone):
     # Nothing was written after the reboot: the connection just closes.
     assert tcp_phone.receive(timeout=5) == b""
     assert (root / ".emu/power.log").read_text() == "restart recovery\n"
+
+
+def connect(port, timeout=20.0):
+    deadline = time.monotonic() + timeout
+    while True:
+        try:
+            return socket.create_connection(("127.0.0.1", port), timeout=10)
+        except OSError:
+            if time.monotonic() > deadline:
+                raise
+            time.sleep(0.05)
+
+
+def test_launcher_serves_one_station_after_another(device_root):
+    install_script(device_root, "am", "reboot\n")
+    port = free_port()
+    launcher = subprocess.Popen(
+        [sys.executable, str(SOURCE / "emulator/atcid-emu"), "--root", str(device_root), "--keep",
+         "--port", str(port), "--bin", str(BINARY)], stdout=subprocess.DEVNULL)
+    try:
+        for _ in range(2):
+            with connect(port) as station:
+                station.sendall(b"ATI")
+                assert station.recv(100) == b"ATI\r\nERROR\r\n"
+        # A power request ends the phone: the launcher does not start the daemon again.
+        with connect(port) as station:
+            station.sendall(EMERGENCY)
+            assert station.recv(100) == b""
+        assert launcher.wait(timeout=20) == 0
+        assert (device_root / ".emu/power.log").read_text() == "restart\n"
+        assert (device_root / ".emu/atcid.log").read_text().count(
+            "The station closed the connection") == 2
+    finally:
+        if launcher.poll() is None:
+            launcher.send_signal(signal.SIGTERM)
+            launcher.wait(timeout=20)
