@@ -101,6 +101,14 @@ def test_tcp_station_hang_up_ends_the_daemon(tcp_phone):
     assert "The station closed the connection" in tcp_phone.log()
 
 
+def test_tcp_end_of_service_command_ends_the_daemon(tcp_phone):
+    # The answer comes first; the next receive on the closed descriptor ends the daemon.
+    line = b"AT+JVSSID=0"
+    assert tcp_phone.command(line) == framed_tcp(line, b"", b"Not Implement")
+    assert tcp_phone.wait() == 0
+    assert "Failed to receive command !!! error: 9" in tcp_phone.log()
+
+
 def listening_address(port):
     """The local address of the socket listening on `port`, as /proc/net/tcp shows it."""
     for line in open("/proc/net/tcp").readlines()[1:]:
