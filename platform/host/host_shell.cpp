@@ -41,6 +41,7 @@ constexpr int kHolderRoot = 4;
 std::mutex g_holder_lock;
 UniqueFd g_requests;   // the daemon's end of the holder's request socket
 pid_t g_holder = -1;   // the child that entered the namespaces (the holder init's parent)
+std::string g_holder_root;  // the root it is chrooted into
 
 void record_command(const char* command) {
   if (host_make_dirs("/.emu") != 0) return;
@@ -145,9 +146,10 @@ bool write_file(const char* path, const char* text) {
   _exit(0);
 }
 
-// Called with g_holder_lock held. Forgets a holder that has gone and starts one if none runs.
+// Called with g_holder_lock held. Forgets a holder that has gone, or that serves another root
+// (in-process tests change roots), and starts one if none runs.
 bool ensure_holder(bool restart) {
-  if (restart && g_requests.ok()) {
+  if ((restart || g_holder_root != host_root_path()) && g_requests.ok()) {
     g_requests.reset();
     if (g_holder > 0) ::waitpid(g_holder, nullptr, 0);
     g_holder = -1;
@@ -172,6 +174,7 @@ bool ensure_holder(bool restart) {
   }
   g_requests = std::move(requests);
   g_holder = pid;
+  g_holder_root = host_root_path();
   return true;
 }
 
