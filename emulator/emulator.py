@@ -199,9 +199,11 @@ def power_log_size(root):
         return 0
 
 
-# A daemon that ends sooner than this after its start is started again only after this pause,
-# so one that cannot serve at all is not restarted in a tight loop.
-RESTART_PAUSE = 1.0
+# The least time from one start of the daemon to the next, so a daemon that cannot serve is
+# never restarted in a tight loop: short after a normal ending (a station hung up), longer
+# after a failure (its port cannot be opened or used).
+RESTART_PAUSE = 0.05
+RESTART_PAUSE_FAILED = 1.0
 
 
 def run_service(binary, root, log_path, port=None, listen=None, on_start=None, stopping=None):
@@ -222,7 +224,8 @@ def run_service(binary, root, log_path, port=None, listen=None, on_start=None, s
         status = proc.wait()
         if stopping.is_set() or power_log_size(root) > before:
             return status
-        if stopping.wait(max(0.0, RESTART_PAUSE - (time.monotonic() - started))):
+        pause = RESTART_PAUSE if status == 0 else RESTART_PAUSE_FAILED
+        if stopping.wait(max(0.0, pause - (time.monotonic() - started))):
             return status
 
 
