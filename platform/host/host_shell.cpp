@@ -81,12 +81,18 @@ bool write_file(const char* path, const char* text) {
     while (::waitpid(shell, &status, 0) < 0 && errno == EINTR) {
     }
   }
-  [[maybe_unused]] const ssize_t n = ::write(reply, &status, sizeof status);
+  [[maybe_unused]] const ssize_t n = ::send(reply, &status, sizeof status, MSG_NOSIGNAL);
   _exit(0);
 }
 
 // PID 1 of the namespace: one runner per request; orphans are reaped by ignoring SIGCHLD.
 [[noreturn]] void holder_init() {
+  // Commands start as from a fresh init: default signals (the daemon ignores SIGPIPE), none
+  // blocked.
+  ::signal(SIGPIPE, SIG_DFL);
+  sigset_t none;
+  sigemptyset(&none);
+  ::sigprocmask(SIG_SETMASK, &none, nullptr);
   ::signal(SIGCHLD, SIG_IGN);
   static char command[kMaxCommand + 1];
   if (::send(kHolderRequests, "r", 1, MSG_NOSIGNAL) != 1) _exit(kCouldNotExecute);
