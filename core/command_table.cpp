@@ -1,6 +1,7 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/amplifier.h"
 #include "commands/audio_path.h"
 #include "commands/device_info.h"
 #include "commands/storage.h"
@@ -80,7 +81,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSFT", kSetOrAction, pending_family_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
-    {"AT+ZNGF", kSetOrAction, pending_family_handler},
+    {"AT+ZNGF", kSetOrAction, smart_speaker_Amplifier_calibrate_handler},
     {"AT+JVSYJM", kSetOrAction, pending_family_handler},
     {"AT+JVSSID", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVSEBOOT", kSetOrAction, jvseboot_handler},
@@ -99,7 +100,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
-    {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
+    {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
     {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
