@@ -20,11 +20,11 @@ namespace {
 
 // The shell texts of one amplifier family's calibration.
 struct AmplifierFamily {
-  const char* calibrate;     // starts the calibration
-  const char* save_status;   // keeps the amplifier's status in the result file
-  const char* read_log;      // what the result read logs
-  const char* read_result;   // keeps the calibration register in the result file
-  const char* finish;        // ends the calibration
+  const char* calibrate;    // starts the calibration
+  const char* save_status;  // keeps the amplifier's status in the result file
+  const char* read_log;     // what the result read logs
+  const char* read_result;  // keeps the calibration register in the result file
+  const char* finish;       // ends the calibration
 };
 
 constexpr AmplifierFamily kTfa9890{
