@@ -289,7 +289,7 @@ bool route_volume(const HeadsetRoute& route, const char* cmdline, uint32_t* volu
   uint32_t b = 0;
   if (!route_gain_field(cmdline, 1, &a) || !route_gain_field(cmdline, 2, &b)) return false;
   *volume = static_cast<uint8_t>(b) * 256u + static_cast<uint8_t>(a);
-  atci_log_untagged(LOG_LVL_DEBUG, "volume = %u\r\n", *volume);
+  atci_log_untagged(LOG_LVL_DEBUG, "volume = %d\r\n", static_cast<int>(*volume));
   return true;
 }
 
