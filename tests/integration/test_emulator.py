@@ -11,6 +11,8 @@ import subprocess
 import sys
 import time
 
+import pytest
+
 import emulator
 from conftest import BINARY, SOURCE, free_port
 
@@ -77,14 +79,18 @@ def test_background_job_outlives_its_call_and_ends_with_the_daemon(tcp_phone):
         os.close(job)
 
 
-def test_shell_reboot_ends_the_daemon(tcp_phone):
+@pytest.mark.parametrize("command, request_line", [
+    ("reboot recovery", "restart recovery\n"),
+    ("reboot -p", "power-off\n"),
+])
+def test_shell_reboot_ends_the_daemon(tcp_phone, command, request_line):
     root = tcp_phone.root
-    install_script(root, "am", "reboot recovery\n")
+    install_script(root, "am", command + "\n")
     tcp_phone.send(EMERGENCY)
     assert tcp_phone.wait() == 0
     # Nothing was written after the reboot: the connection just closes.
     assert tcp_phone.receive(timeout=5) == b""
-    assert (root / ".emu/power.log").read_text() == "restart recovery\n"
+    assert (root / ".emu/power.log").read_text() == request_line
 
 
 def connect(port, timeout=20.0):
