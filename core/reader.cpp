@@ -49,10 +49,13 @@ void reopen_port(SerialDevice* device, int index) {
 // The station hung up or the connection broke: the service is over. On the phone init starts
 // the daemon again for the next station.
 [[noreturn]] void end_of_connection(ssize_t received) {
-  if (received == 0)
+  const int error = errno;
+  if (received == 0) {
     ATCI_LOGI("The station closed the connection\n");
-  else
-    ATCI_LOGE("Failed to receive command !!! error: %d\n", errno);
+  } else {
+    ATCI_LOGE("Failed to receive command !!!\n");
+    ATCI_LOGE("receive error: %d", error);
+  }
   std::exit(0);
 }
 
