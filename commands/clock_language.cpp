@@ -70,12 +70,17 @@ bool all_digits(std::string_view text) {
 
 int set_system_time(const char* cmdline) {
   ATCI_LOGD("==entry set date and time \r\n");
+  // Each field ends at its own delimiter, which strtok consumes with it: 2026-11-15,08:20:00
   std::string_view rest(cmdline);
-  next_token(rest, ",");
-  // Each field ends at its own delimiter: 2026-11-15,08:20:00
+  auto field = [&rest](std::string_view ends) {
+    const std::string_view token = next_token(rest, ends);
+    if (!rest.empty()) rest.remove_prefix(1);
+    return token;
+  };
+  field(",");
   static constexpr std::string_view kEnds[] = {"-", "-", ",", ":", ":", ","};
   std::string_view fields[6];
-  for (size_t i = 0; i < 6; ++i) fields[i] = next_token(rest, kEnds[i]);
+  for (size_t i = 0; i < 6; ++i) fields[i] = field(kEnds[i]);
   const auto [year, month, day, hour, minute, second] = fields;
   ATCI_LOGD("year=%.*s,month=%.*s,date=%.*s,hour=%.*s,minute=%.*s,second=%.*s\r\n",
             static_cast<int>(year.size()), year.data(), static_cast<int>(month.size()),
