@@ -59,15 +59,19 @@ int write_nv_item(uint32_t item, uint8_t option, const char* value) {
   return RESULT_OK;
 }
 
+void copy_field(std::string_view field, char (&out)[CMD_LINE_SIZE]) {
+  const size_t length = std::min(field.size(), sizeof out - 1);
+  field.copy(out, length);
+  out[length] = '\0';
+}
+
 // The `index`th ","-field as strtok finds it (empty fields skipped), normalised by substring
 // into `out`. False when the field is missing or nothing is left of it.
 bool normalised_field(const char* cmdline, int index, char (&out)[CMD_LINE_SIZE]) {
   std::string_view rest(cmdline);
   std::string_view field;
   for (int i = 0; i <= index; ++i) field = next_token(rest, ",");
-  const size_t length = std::min(field.size(), sizeof out - 1);
-  field.copy(out, length);
-  out[length] = '\0';
+  copy_field(field, out);
   ATCI_LOGD("===========Before value:%s\r\n", out);
   substring(out);
   ATCI_LOGD("===========After value:%s\r\n", out);
@@ -269,9 +273,7 @@ int property_set_handler(char* cmdline, int, char* response) {
     const std::string_view field = next_token(rest, ",");
     if (field.empty()) return RESULT_ERROR;
     char name[CMD_LINE_SIZE];
-    const size_t length = std::min(field.size(), sizeof name - 1);
-    field.copy(name, length);
-    name[length] = '\0';
+    copy_field(field, name);
     lower_ascii(name);
     property_get(name, response, "NULL");
     return RESULT_OK;

@@ -47,6 +47,14 @@ constexpr RegionCode kRegionCodes[] = {
 
 constexpr uint32_t kRegionCodeItem = 65633;
 
+using StoredFlag = char[sizeof(ulda_nvram::optr_flag) + 1];
+
+// The flag field fills its whole width when it is as long as the field: no terminator.
+void read_stored_flag(const ulda_nvram& record, StoredFlag& flag) {
+  std::memcpy(flag, record.optr_flag, sizeof record.optr_flag);
+  flag[sizeof record.optr_flag] = '\0';
+}
+
 bool is_region_product() {
   for (const char* model : kRegionProducts)
     if (is_product_model(model)) return true;
@@ -108,8 +116,8 @@ int set_optr_flag(const char* flag, char* response) {
   ATCI_LOGD("optr flag : %s, length = %d", flag, static_cast<int>(std::strlen(flag)));
   ulda_nvram record;
   if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-  char stored[sizeof record.optr_flag + 1] = {};
-  std::memcpy(stored, record.optr_flag, sizeof record.optr_flag);
+  StoredFlag stored;
+  read_stored_flag(record, stored);
   const std::string_view text(flag);
 
   if (std::strcmp(stored, flag) == 0) {
@@ -229,8 +237,8 @@ int optr_flag_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+JVOPTR=0")) {
     ulda_nvram record;
     if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-    char stored[sizeof record.optr_flag + 1] = {};
-    std::memcpy(stored, record.optr_flag, sizeof record.optr_flag);
+    StoredFlag stored;
+    read_stored_flag(record, stored);
     ATCI_LOGD("ulda_nvram.optr_flag: %s", stored);
     return answer_quoted(response, stored);
   }
@@ -248,8 +256,8 @@ int check_oem_handler(char* cmdline, int, char*) {
   }
   ulda_nvram record;
   if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-  char flag[sizeof record.optr_flag + 1] = {};
-  std::memcpy(flag, record.optr_flag, sizeof record.optr_flag);
+  StoredFlag flag;
+  read_stored_flag(record, flag);
   char customize[PROPERTY_VALUE_MAX];
   property_get("ro.product.customize.kro", customize, "");
   ATCI_LOGD("ro.product.customize.kro: %s", customize);
