@@ -44,14 +44,16 @@ int read_nv_item(uint32_t item, uint8_t option, char* response) {
   return RESULT_OK;
 }
 
-int write_nv_item(uint32_t item, uint8_t option, const char* value) {
+// `request_name` names the request in the log as each command always has.
+int write_nv_item(uint32_t item, uint8_t option, const char* value, const char* request_name) {
   kro_write_nv_info_req_msg_v01 req{};
   req.nvItem_id = item;
   req.buffer_valid = 1;
   std::memcpy(req.buffer, value, strnlen(value, sizeof req.buffer));
   req.option[0] = req.option[1] = option;
-  ATCI_LOGD("=======data_req_for_put_nv.nvItem_id:%d,data_req_for_put_nv.buffer:%.*s\n",
-            static_cast<int>(item), static_cast<int>(sizeof req.buffer), req.buffer);
+  ATCI_LOGD("======before set buffer\n");
+  ATCI_LOGD("=======%s.nvItem_id:%d,%s.buffer:%.*s\n", request_name, static_cast<int>(item),
+            request_name, static_cast<int>(sizeof req.buffer), req.buffer);
   qmi::client_type clnt{};
   qmi::txn_handle txn{};
   if (modem_request_failed(qmi_kro_write_nv_msg(&clnt, &txn, &req))) return RESULT_ERROR;
@@ -67,14 +69,15 @@ void copy_field(std::string_view field, char (&out)[CMD_LINE_SIZE]) {
 
 // The `index`th ","-field as strtok finds it (empty fields skipped), normalised by substring
 // into `out`. False when the field is missing or nothing is left of it.
-bool normalised_field(const char* cmdline, int index, char (&out)[CMD_LINE_SIZE]) {
+bool normalised_field(const char* cmdline, int index, const char* value_name,
+                      char (&out)[CMD_LINE_SIZE]) {
   std::string_view rest(cmdline);
   std::string_view field;
   for (int i = 0; i <= index; ++i) field = next_token(rest, ",");
   copy_field(field, out);
-  ATCI_LOGD("===========Before value:%s\r\n", out);
+  ATCI_LOGD("===========Before %s:%s\r\n", value_name, out);
   substring(out);
-  ATCI_LOGD("===========After value:%s\r\n", out);
+  ATCI_LOGD("===========After %s:%s\r\n", value_name, out);
   return out[0] != '\0';
 }
 
@@ -97,23 +100,26 @@ struct NvItemCommand {
   const char* write_prefix;
   uint32_t item;
   const char* missing_log;
+  const char* value_name;    // in the log
+  const char* request_name;  // in the log
 };
 
 constexpr NvItemCommand kTdNvItem{"AT+JVTDNV=0", "AT+JVTDNV=1", 66024,
-                                  "========nv_value is NULL\n"};
+                                  "========nv_value is NULL\n", "nv_value", "data_req_for_put_nv"};
 constexpr NvItemCommand kSignalSystemItem{"AT+JVSYS=0", "AT+JVSYS=1", 72542,
-                                          "========The wlan addr is NULL====\r\n"};
+                                          "========The wlan addr is NULL====\r\n", "value",
+                                          "data_req"};
 
 int nv_item_command(const NvItemCommand& command, char* cmdline, char* response) {
   ATCI_LOGD("%s start\n", cmdline);
   if (line_is(cmdline, command.read_line)) return read_nv_item(command.item, 0, response);
   if (!line_starts_with(cmdline, command.write_prefix)) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 1, value)) {
+  if (!normalised_field(cmdline, 1, command.value_name, value)) {
     ATCI_LOGE("%s", command.missing_log);
     return RESULT_ERROR;
   }
-  return write_nv_item(command.item, 0, value);
+  return write_nv_item(command.item, 0, value, command.request_name);
 }
 
 // ---- Device-key tool ----
@@ -238,13 +244,13 @@ int imei_and_pcb_code_on_handler(char* cmdline, int, char* response) {
   const bool barcode = !imei && !imei_with_options && line_starts_with(cmdline, "AT+EGMR=1,5");
   if (!imei && !imei_with_options && !barcode) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 2, value)) {
+  if (!normalised_field(cmdline, 2, "barcode", value)) {
     ATCI_LOGE("========Barcode is NULL\n");
     return RESULT_ERROR;
   }
-  ATCI_LOGD("======before set buffer\n");
   const uint32_t item = barcode ? kBarcodeItem : kImeiItem;
-  if (write_nv_item(item, imei_with_options ? 1 : 0, value) != RESULT_OK) return RESULT_ERROR;
+  if (write_nv_item(item, imei_with_options ? 1 : 0, value, "data_req_for_put_nv") != RESULT_OK)
+    return RESULT_ERROR;
   if (barcode) property_set("persist.sys.barcode", value);
   return RESULT_OK;
 }

@@ -66,7 +66,7 @@ def test_date_refuses_other_values(phone_sh):
                  ["-s", "$(reboot)"], ["+%s"], ["20261115.082000"]):
         assert phone_sh("/system/bin/date", *args).returncode == 1, args
         assert not offset.exists(), args
-    before = datetime.datetime.utcnow()
+    before = datetime.datetime.now(datetime.timezone.utc).replace(tzinfo=None)
     machine = clock_reading(phone_sh("/system/bin/date").stdout)
     assert abs(machine - before) < datetime.timedelta(minutes=5)
 
