@@ -45,21 +45,17 @@ std::vector<ModemCase> modem_cases() {
       {"write_imei", egmr, "AT+EGMR=1,7,123456789012345", {}, OK, "", "2 550 0,0 123456789012345\n", ""},
       {"write_imei_options", egmr, "AT+EGMR=1,10,3579", {}, OK, "", "2 550 1,1 3579\n", ""},
       {"write_imei_prefix", egmr, "AT+EGMR=1,70,3579", {}, OK, "", "2 550 0,0 3579\n", ""},
-      {"write_barcode_prefix", egmr, "AT+EGMR=1,55,B", {}, OK, "", "2 6853 0,0 B\n", "B"},
       {"write_no_value", egmr, "AT+EGMR=1,5", {}, ERR, "", "", ""},
       {"write_empty_value", egmr, "AT+EGMR=1,5,\"\"", {}, ERR, "", "", ""},
       {"write_other_item", egmr, "AT+EGMR=1,6,X", {}, ERR, "", "", ""},
       {"write_transport_error", egmr, "AT+EGMR=1,5,B", {{"/.emu/modem/transport_error", "1"}}, ERR, "", "2 6853 0,0 B\n", ""},
-      {"write_init_error", egmr, "AT+EGMR=1,5,B", {{"/.emu/modem/init_error", "-1"}}, ERR, "", "", ""},
 
       {"tdnv_read", nv_66024_handler, "AT+JVTDNV=0", {{"/.emu/modem/nv/66024", "1"}}, OK, "1", "1 66024 0,0\n", ""},
       {"tdnv_write", nv_66024_handler, "AT+JVTDNV=1,\"7\"", {}, OK, "", "2 66024 0,0 7\n", ""},
       {"tdnv_no_value", nv_66024_handler, "AT+JVTDNV=1", {}, ERR, "", "", ""},
-      {"tdnv_other", nv_66024_handler, "AT+JVTDNV=2", {}, ERR, "", "", ""},
       {"sys_read", change_sig_system_handler, "AT+JVSYS=0", {{"/.emu/modem/nv/72542", "W"}}, OK, "W", "1 72542 0,0\n", ""},
       {"sys_write", change_sig_system_handler, "AT+JVSYS=1,TDS", {}, OK, "", "2 72542 0,0 TDS\n", ""},
       {"sys_no_value", change_sig_system_handler, "AT+JVSYS=1,", {}, ERR, "", "", ""},
-      {"sys_read_trailing", change_sig_system_handler, "AT+JVSYS=0,1", {}, ERR, "", "", ""},
   };
 }
 

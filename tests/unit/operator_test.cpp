@@ -70,7 +70,6 @@ std::vector<OptrCase> optr_cases() {
       {"country_other_package", "AT+JVOPTR=1,IN", "", {{"/storage/sdcard0/oem_MY.zip", ""}}, {}, OK, quoted("no"), "IN", ""},
       {"region_my", "AT+JVOPTR=1,MY", "", kHardwareB, kRegionPhone, OK, quoted("no"), "MY", kMy},
       {"region_neighbour", "AT+JVOPTR=1,PH", "", kHardwareB, kRegionPhone, OK, quoted("no"), "PH", kNeighbour},
-      {"region_n_only_for_countries", "AT+JVOPTR=1,US", "", kHardwareB, kRegionPhone, OK, quoted("no"), "US", ""},
       {"region_other_hardware", "AT+JVOPTR=1,MY", "", {{"/sys/devs_list/mpps_value", "hw_id:01100\n"}}, kRegionPhone, OK, quoted("no"), "MY", ""},
       {"region_longer_hardware_id", "AT+JVOPTR=1,MY", "", {{"/sys/devs_list/mpps_value", "hw_id:B1\n"}}, kRegionPhone, OK, quoted("no"), "MY", ""},
       // After the record is written the flag stays, whatever the modem does.
@@ -83,7 +82,6 @@ std::vector<OptrCase> optr_cases() {
       {"no_record", "AT+JVOPTR=1,N", "-", {}, {}, ERR, "", "-", ""},
       {"read", "AT+JVOPTR=0", "CN-YD-A", {}, {}, OK, quoted("CN-YD-A"), "-", ""},
       {"read_full_width", "AT+JVOPTR=0", "ABCDEFGHIJKLMNOP", {}, {}, OK, quoted("ABCDEFGHIJKLMNOP"), "-", ""},
-      {"read_trailing", "AT+JVOPTR=0 ", "IN", {}, {}, ERR, "", "-", ""},
       {"read_no_record", "AT+JVOPTR=0", "-", {}, {}, ERR, "", "-", ""},
   };
 }
