@@ -148,3 +148,26 @@ def test_cut_transfer_keeps_the_older_file(phone):
     wait_log(p, "write file error")
     assert (p.root / "data/keep.bin").read_bytes() == b"older"
     assert sorted(f.name for f in (p.root / "data").iterdir()) == ["keep.bin"]
+
+
+def wait_for_file(path, content, timeout=60.0):
+    deadline = time.monotonic() + timeout
+    while time.monotonic() < deadline:
+        if path.exists() and path.read_bytes() == content:
+            return True
+        time.sleep(0.02)
+    return False
+
+
+def test_root_integrity_check_runs_the_stand_in(tcp_phone):
+    p = tcp_phone
+    result = p.root / "data/rooIntegityCheck.txt"
+    assert p.command(b"AT+JVKJ=1") == framed_tcp(b"AT+JVKJ=1", b"", b"OK")
+    assert wait_for_file(result, b"pass\n")
+    (p.root / ".emu/richk").write_bytes(b"rooted\n")
+    # A check still running (its chmod) makes the command start none: ask until one runs.
+    for _ in range(20):
+        assert p.command(b"AT+JVKJ=1") == framed_tcp(b"AT+JVKJ=1", b"", b"OK")
+        if wait_for_file(result, b"rooted\n", timeout=3.0):
+            break
+    assert result.read_bytes() == b"rooted\n"
