@@ -4,6 +4,7 @@ import hashlib
 import os
 import random
 import time
+import zipfile
 
 import pytest
 
@@ -99,6 +100,45 @@ def test_master_clear_answers_before_recovery(tcp_phone):
     record = (p.root / "persist/ulda_nvram").read_bytes()
     assert record[4:12] == (1).to_bytes(4, "little") + (13).to_bytes(4, "little")
     assert '/system/bin/sh -c "reboot recovery"' in p.shell_log()
+
+
+def put_apps_package(root, version="version=QM0305_V1.0.12_20261101\n"):
+    with zipfile.ZipFile(root / "storage/sdcard0/apps.zip", "w") as zf:
+        zf.writestr("apps.version", version)
+
+
+def test_apps_update_goes_through_recovery(tcp_phone):
+    p = tcp_phone
+    put_apps_package(p.root)
+    p.set_property("persist.sys.is_kro_log", "1")
+    p.send(b"AT+JVUPDATE=1")
+    early = b"AT+JVUPDATE=1\r\n\r\nOK\r\n"
+    assert read_exactly("tcp", p, len(early)) == early
+    wait_log(p, "reboot recovery")
+    assert (p.root / "cache/recovery/command").read_bytes() == b"--update_app"
+    record = (p.root / "persist/ulda_nvram").read_bytes()
+    assert record[4:12] == (0).to_bytes(4, "little") + (256).to_bytes(4, "little")
+    assert (p.root / "dev/__properties__/persist.sys.is_kro_log").read_text() == "0"
+    card = p.root / "storage/sdcard0"
+    assert (card / "apps.zip").exists() and not (card / "DCIM").exists()
+
+
+@pytest.mark.parametrize("version, body, word, broadcast", [
+    ("version=QM0305_V1.0.12_20261101\n", b"", b"OK",
+     "am broadcast -n com.ulda.engineermode/.UpdateSWReceiver -a android.flashOP.UpdateSW"
+     " -e mode update_with_app -e optr CMCC"),
+    ("version=QM0305_V1.0.13_20261101\n",
+     b"\r\nAPP version is not consistent with the software version!\r\n", b"ERROR", None),
+])
+def test_operator_and_apps_update(tcp_phone, version, body, word, broadcast):
+    p = tcp_phone
+    record = bytearray((p.root / "persist/ulda_nvram").read_bytes())
+    record[244:260] = b"CMCC".ljust(16, b"\0")
+    (p.root / "persist/ulda_nvram").write_bytes(bytes(record))
+    (p.root / "storage/sdcard0/oem_CMCC.zip").write_bytes(b"zip")
+    put_apps_package(p.root, version)
+    assert p.command(b"AT+JVUPDATE=2") == framed_tcp(b"AT+JVUPDATE=2", body, word)
+    assert (broadcast in p.shell_log()) if broadcast else not p.shell_log()
 
 
 def encoded(content):
