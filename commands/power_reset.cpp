@@ -96,8 +96,7 @@ int master_clear() {
 }
 
 int install_operator_package(const char* cmdline, char* response) {
-  const std::string_view rest_of_line(cmdline);
-  std::string_view rest = rest_of_line;
+  std::string_view rest(cmdline);
   next_token(rest, ",");
   const std::string_view name = next_token(rest, ",");
   if (name.empty()) return RESULT_ERROR;
