@@ -1,10 +1,11 @@
 #include "commands/factory_flags.h"
 
+#include <strings.h>
+
 #include <charconv>
 #include <cstdint>
 #include <cstdio>
 #include <string_view>
-#include <strings.h>
 
 #include "commands/command_util.h"
 #include "commands/usb_adb.h"
@@ -174,8 +175,8 @@ int jvfeature_handler(char* cmdline, int, char* response) {
   ulda_nvram record;
   if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
   ATCI_LOGD("==ulda_nvram.special_feature:%d", record.special_feature);
-  return answer_quoted_int(response,
-                           static_cast<int32_t>(mask & static_cast<uint32_t>(record.special_feature)));
+  return answer_quoted_int(
+      response, static_cast<int32_t>(mask & static_cast<uint32_t>(record.special_feature)));
 }
 
 int jvtestmmi_handler(char* cmdline, int, char*) {

@@ -1,5 +1,10 @@
 #include "commands/file_transfer.h"
 
+#include <fcntl.h>
+#include <strings.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
@@ -7,11 +12,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
-#include <fcntl.h>
 #include <string_view>
-#include <strings.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include "commands/command_util.h"
 #include "core/command.h"

@@ -1,11 +1,12 @@
 #include "commands/power_reset.h"
 
-#include <cstdio>
-#include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
-#include <string_view>
 #include <unistd.h>
+
+#include <cstdio>
+#include <cstring>
+#include <string_view>
 
 #include "commands/command_util.h"
 #include "commands/storage.h"
@@ -31,7 +32,9 @@ constexpr size_t kRecoveryTextMax = 255;
 void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
 
 // The phone is about to go away: the station hears OK now or never.
-void early_answer(const char* text) { writeDataToSerial(text, static_cast<int>(std::strlen(text))); }
+void early_answer(const char* text) {
+  writeDataToSerial(text, static_cast<int>(std::strlen(text)));
+}
 
 // "%s\r\n\r\nOK\r\n" with the line, as the update commands answer before recovery.
 void early_answer_line(const char* cmdline) {
@@ -41,8 +44,7 @@ void early_answer_line(const char* cmdline) {
 }
 
 void ensure_recovery_dir() {
-  if (dev_access(kRecoveryDir, F_OK) != 0)
-    run_shell("/system/bin/sh -c \"mkdir /cache/recovery\"");
+  if (dev_access(kRecoveryDir, F_OK) != 0) run_shell("/system/bin/sh -c \"mkdir /cache/recovery\"");
 }
 
 // Recovery reads the command file at its next start.
@@ -260,7 +262,8 @@ int jvrtall_handler(char* cmdline, int, char* response) {
 }
 
 int jvupdate_handler(char* cmdline, int, char* response) {
-  if (line_starts_with(cmdline, "AT+JVUPDATE=3")) return install_operator_package(cmdline, response);
+  if (line_starts_with(cmdline, "AT+JVUPDATE=3"))
+    return install_operator_package(cmdline, response);
   if (line_starts_with(cmdline, "AT+JVUPDATE=1")) return update_from_card(cmdline, false, response);
   if (line_starts_with(cmdline, "AT+JVUPDATE=2")) return update_from_card(cmdline, true, response);
   return REJECT_COMMAND_LINE(cmdline);

@@ -1,12 +1,13 @@
 #include "commands/usb_adb.h"
 
-#include <cstdio>
-#include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
-#include <memory>
 #include <strings.h>
 #include <unistd.h>
+
+#include <cstdio>
+#include <cstring>
+#include <memory>
 
 #include "commands/command_util.h"
 #include "core/command.h"

@@ -2,8 +2,9 @@
 // end of the line, and the cable watch that powers the phone down once the cable is pulled.
 #pragma once
 
-#include <atomic>
 #include <pthread.h>
+
+#include <atomic>
 
 // Commits the data partition, and with it the factory record, by writing and syncing a
 // 2 MiB scratch file that is then deleted. 0, or -1 when the file cannot be created.
