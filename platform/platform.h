@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <cstdio>
 #include <dirent.h>
 #include <sys/stat.h>
@@ -43,9 +44,16 @@ void platform_log_flush();
 // Runs a command text as system(3) would and returns its wait status.
 int platform_system(const char* command);
 
+// Commits written data to storage before the link or the power goes away. A host build
+// flushes only the file system of the device root.
+void platform_sync();
+
 // The phone goes away: neither returns.
 [[noreturn]] void platform_restart();
 [[noreturn]] void platform_power_off();
 
 // TCP port of the socket transport.
 int platform_tcp_port();
+// IPv4 address (network byte order) the socket transport listens on: all interfaces on the
+// phone. 0, or -1 when the configured address is not usable.
+int platform_tcp_listen_address(uint32_t* address);
