@@ -8,7 +8,7 @@ import time
 import pytest
 
 import emulator
-from conftest import BINARY, BLOCK, TcpPhone, TtyPhone, framed_tcp, framed_tty
+from conftest import BINARY, BLOCK, PATIENCE, TcpPhone, TtyPhone, framed_tcp, framed_tty
 
 # Commands whose rows have no behaviour of their own answer "Not Implement" in every
 # accepted form; they exercise the dispatcher without depending on any command family.
@@ -86,7 +86,7 @@ def test_tty_cable_pulled_and_reopen_fails(usb_phone):
 
 def test_tcp_blocks_are_padded_and_paced(tcp_phone):
     tcp_phone.send(UNSPECIFIED + b"=1")
-    tcp_phone.sock.settimeout(5)
+    tcp_phone.sock.settimeout(PATIENCE)
     data = b""
     block_arrival = {}
     while len(data) < 3 * BLOCK:
@@ -162,7 +162,7 @@ def test_port_selection(device_root, cmdline, kroem, expected):
 def run_daemon(root):
     """Runs the daemon on `root` until it ends by itself; returns its status."""
     with open(root / ".emu/atcid.log", "ab") as log:
-        return emulator.start_daemon(BINARY, root, log=log).wait(timeout=10)
+        return emulator.start_daemon(BINARY, root, log=log).wait(timeout=PATIENCE)
 
 
 def test_usb_port_that_cannot_open(device_root):
@@ -175,7 +175,7 @@ def test_usb_port_that_cannot_open(device_root):
 
 def test_missing_root_is_refused():
     env = {k: v for k, v in os.environ.items() if k != "ATCID_ROOT"}
-    result = subprocess.run([str(BINARY)], env=env, capture_output=True, timeout=10)
+    result = subprocess.run([str(BINARY)], env=env, capture_output=True, timeout=PATIENCE)
     assert result.returncode != 0
     assert b"ATCID_ROOT" in result.stderr
 
