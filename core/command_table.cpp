@@ -1,6 +1,8 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/amplifier.h"
+#include "commands/audio_path.h"
 #include "commands/device_info.h"
 #include "commands/storage.h"
 
@@ -20,7 +22,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+EQSB", kSetOrAction, pending_family_handler},
     {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, pending_family_handler},
-    {"AT+JVXL", kSetOrAction, pending_family_handler},
+    {"AT+JVXL", kSetOrAction, play_ring_handler},
     {"AT+ESLP", kSetOrAction, pending_family_handler},
     {"AT+JVKJ", kSetOrAction, pending_family_handler},
     {"AT+JVDL", kSetOrAction, pending_family_handler},
@@ -29,7 +31,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVTWST", kSetOrAction, jvtwst_handler},
     {"AT+JVSIM", kSetOrAction, jvsim_handler},
     {"AT+JVSD", kSetOrAction, jvsd_handler},
-    {"AT+JVMP", kSetOrAction, pending_family_handler},
+    {"AT+JVMP", kSetOrAction, play_media_handler},
     {"AT+JVTR", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVNC", kSetOrAction, pending_family_handler},
     {"AT+JVDLJ", kSetOrAction, pending_family_handler},
@@ -38,7 +40,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVUDWR", kSetOrAction, jvudwr_handler},
     {"AT+JVUDROOM", kSetOrAction, jvudroom_handler},
     {"AT+JVRDNV", kSetOrAction, pending_family_handler},
-    {"AT+JVMD", kSetOrAction, pending_family_handler},
+    {"AT+JVMD", kSetOrAction, ring_test_handler},
     {"AT+JVCHARGE", kSetOrAction, pending_family_handler},
     {"AT+JVCHARG", kSetOrAction, pending_family_handler},
     {"AT+RMCHARGEP", kSetOrAction, pending_family_handler},
@@ -79,7 +81,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSFT", kSetOrAction, pending_family_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
-    {"AT+ZNGF", kSetOrAction, pending_family_handler},
+    {"AT+ZNGF", kSetOrAction, smart_speaker_Amplifier_calibrate_handler},
     {"AT+JVSYJM", kSetOrAction, pending_family_handler},
     {"AT+JVSSID", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVSEBOOT", kSetOrAction, jvseboot_handler},
@@ -98,7 +100,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
-    {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
+    {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
     {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
@@ -109,7 +111,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSIMT", kSetOrAction, pending_family_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
-    {"AT+EALT", kSetOrAction, pending_family_handler},
+    {"AT+EALT", kSetOrAction, mic_echo_handler},
     {"AT+EGMR", kSetOrAction, pending_family_handler},
     {"AT+EMBT", kSetOrAction, pending_family_handler},
     {"AT+JVWLAN", kSetOrAction, pending_family_handler},
@@ -127,21 +129,21 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSG", kSetOrAction, pending_family_handler},
     {"AT+MMILED", kSetOrAction, pending_family_handler},
     {"AT+JVCOM", kSetOrAction, pending_family_handler},
-    {"AT+JVMT", kSetOrAction, pending_family_handler},
+    {"AT+JVMT", kSetOrAction, echo_handler},
     {"AT+JVTDNV", kSetOrAction, pending_family_handler},
     {"AT+JVLOGAT", kSetOrAction, pending_family_handler},
     {"AT+JVQHZS", kSetOrAction, pending_family_handler},
     {"AT+JVLIGHT", kSetOrAction, pending_family_handler},
     {"AT+JVQLOG", kSetOrAction, pending_family_handler},
-    {"AT+JVMTE", kSetOrAction, pending_family_handler},
-    {"AT+JVMTER", kSetOrAction, pending_family_handler},
-    {"AT+JVVMTEL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTS", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSA", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTRA", kSetOrAction, pending_family_handler},
+    {"AT+JVMTE", kSetOrAction, dual_mic_to_headset_handler},
+    {"AT+JVMTER", kSetOrAction, main_mic_to_headset_right_handler},
+    {"AT+JVVMTEL", kSetOrAction, sub_mic_to_headset_left_handler},
+    {"AT+JVEMTS", kSetOrAction, headset_to_speaker_handler},
+    {"AT+JVEMTR", kSetOrAction, headset_to_earpiece_handler},
+    {"AT+JVEMTSR", kSetOrAction, headset_to_right_speaker_handler},
+    {"AT+JVEMTSL", kSetOrAction, headset_to_left_speaker_handler},
+    {"AT+JVEMTSA", kSetOrAction, headset_to_speaker_with_gain_handler},
+    {"AT+JVEMTRA", kSetOrAction, headset_to_earpiece_with_gain_handler},
     {"AT+JVDISRECHARGE", kSetOrAction, pending_family_handler},
     {"AT+JVZFTX", kSetOrAction, pending_family_handler},
     {"AT+JVMEID", kSetOrAction, pending_family_handler},
@@ -152,7 +154,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVVSIM", kSetOrAction, pending_family_handler},
     {"AT+JVDPDT", kSetOrAction, pending_family_handler},
     {"AT+JVFILE", kSetOrAction, pending_family_handler},
-    {"AT+JVKTV", kSetOrAction, pending_family_handler},
+    {"AT+JVKTV", kSetOrAction, ktv_test_handler},
 };
 
 int pending_family_handler(char*, int, char*) { return RESULT_NOT_IMPLEMENTED; }
