@@ -15,6 +15,7 @@ import os
 import select
 import shutil
 import socket
+import subprocess
 import sys
 import tempfile
 import time
@@ -156,7 +157,7 @@ def connect(port, proc):
 def ended(proc, timeout):
     try:
         return proc.wait(timeout=timeout)
-    except Exception:
+    except subprocess.TimeoutExpired:
         return None
 
 
