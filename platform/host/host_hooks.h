@@ -10,3 +10,7 @@ void host_set_shell_hook(ShellHook hook);
 // "power-off" instead of ending the process. The hook must not return.
 using PowerHook = void (*)(const char* what);
 void host_set_power_hook(PowerHook hook);
+
+// Transport workers of the emulated QMI service started and not yet joined: a released client
+// leaves none behind, so tests can tell a leaked or unjoined worker without racing the kernel.
+int host_qmi_live_workers();

@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <charconv>
 #include <condition_variable>
 #include <cstdio>
@@ -18,6 +19,7 @@
 #include <string>
 #include <string_view>
 
+#include "platform/host/host_hooks.h"
 #include "platform/host/host_root.h"
 #include "platform/platform.h"
 #include "platform/qmi_transport.h"
@@ -254,6 +256,9 @@ namespace {
 
 constexpr qmi::ServiceObject kKroService{kServiceId};
 
+// Counted from before the worker starts until its join has returned.
+std::atomic<int> g_live_workers{0};
+
 void serve(qmi::Client* client, const Job& job) {
   const QmiMessageSizes sizes = qmi_kro_sizes_of(job.msg_id);
   const int transp_err = switch_value("transport_error");
@@ -308,7 +313,9 @@ int client_init(const service_info* info, service_object_type service, client_ty
   if (info == nullptr || info->word[0] != kServiceId) return SERVICE_ERR;
   auto* c = new (std::nothrow) Client;
   if (c == nullptr) return INTERNAL_ERR;
+  ++g_live_workers;
   if (::pthread_create(&c->worker, nullptr, worker_main, c) != 0) {
+    --g_live_workers;
     delete c;
     return INTERNAL_ERR;
   }
@@ -346,8 +353,11 @@ int client_release(client_type client) {
   }
   client->wake.notify_one();
   ::pthread_join(client->worker, nullptr);
+  --g_live_workers;
   delete client;
   return NO_ERR;
 }
 
 }  // namespace qmi
+
+int host_qmi_live_workers() { return g_live_workers.load(); }

@@ -17,6 +17,9 @@ import emulator  # noqa: E402
 BINARY = Path(os.environ.get("ATCID_BIN", SOURCE / "build" / "atcid"))
 BLOCK = 2048
 RESULT_ENDINGS = (b"OK\r\n", b"ERROR\r\n", b"Not Implement\r\n", b"UNKNOWN\r\n")
+# How long a test waits for something that should happen: only a failing test waits this long,
+# so it is generous enough for a machine that is busy with other work.
+PATIENCE = 30.0
 
 
 def free_port():
@@ -41,13 +44,14 @@ class Phone:
     def start(self, port=None):
         with open(self.log_path, "ab") as log:
             self.proc = emulator.start_daemon(BINARY, self.root, port=port, log=log)
-        if self.ready_text and not emulator.wait_for_log(self.log_path, self.ready_text, self.proc):
+        if self.ready_text and not emulator.wait_for_log(self.log_path, self.ready_text, self.proc,
+                                                         timeout=PATIENCE):
             raise RuntimeError(f"daemon not ready:\n{self.log()[-3000:]}")
 
     def log(self):
         return self.log_path.read_text(errors="replace") if self.log_path.exists() else ""
 
-    def wait(self, timeout=10):
+    def wait(self, timeout=PATIENCE):
         return self.proc.wait(timeout=timeout)
 
     def shell_log(self):
@@ -66,21 +70,23 @@ class TcpPhone(Phone):
     def start(self, port=None):
         self.port = port or free_port()
         super().start(self.port)
-        self.sock = socket.create_connection(("127.0.0.1", self.port), timeout=10)
+        self.sock = socket.create_connection(("127.0.0.1", self.port), timeout=PATIENCE)
 
     def send(self, data):
         self.sock.sendall(data)
 
-    def receive(self, size=None, quiet=0.4, timeout=10.0):
-        """Bytes until `size` arrived, or until the line went quiet after the first byte."""
+    def receive(self, size=None, quiet=0.4, timeout=PATIENCE):
+        """Bytes until `size` arrived, or without a size until the line went quiet after the
+        first byte; a sized read does not stop at a pause, however long the daemon takes."""
         data = b""
         deadline = time.monotonic() + timeout
         while time.monotonic() < deadline and (size is None or len(data) < size):
-            self.sock.settimeout(quiet if data else max(0.01, deadline - time.monotonic()))
+            left = max(0.01, deadline - time.monotonic())
+            self.sock.settimeout(quiet if data and size is None else left)
             try:
                 chunk = self.sock.recv(65536)
             except socket.timeout:
-                if data:
+                if data and size is None:
                     break
                 continue
             if not chunk:
@@ -121,15 +127,18 @@ class TtyPhone(Phone):
         self.station.write(data)
         self.station.flush()
 
-    def receive(self, quiet=0.3, timeout=10.0):
+    def receive(self, quiet=0.3, timeout=PATIENCE, until=RESULT_ENDINGS):
+        """Bytes until the line went quiet after data that ends like an answer (`until`), or
+        until the deadline."""
         data = b""
         deadline = time.monotonic() + timeout
+        self.station.timeout = quiet
         while time.monotonic() < deadline:
             chunk = self.station.read(65536)
             if chunk:
                 data += chunk
                 continue
-            if data:
+            if data and data.endswith(until):
                 break
         return data
 

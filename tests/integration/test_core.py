@@ -8,7 +8,7 @@ import time
 import pytest
 
 import emulator
-from conftest import BINARY, BLOCK, TcpPhone, TtyPhone, framed_tcp, framed_tty, free_port
+from conftest import BINARY, BLOCK, PATIENCE, TcpPhone, TtyPhone, framed_tcp, framed_tty, free_port
 
 # Commands whose rows have no behaviour of their own answer "Not Implement" in every
 # accepted form; they exercise the dispatcher without depending on any command family.
@@ -132,10 +132,11 @@ def test_tcp_listen_address(device_root, listen, address):
         proc = emulator.start_daemon(BINARY, device_root, port=port, log=log, listen=listen)
     try:
         if address is None:
-            assert proc.wait(timeout=10) == 1
+            assert proc.wait(timeout=PATIENCE) == 1
             assert "Bind socket error!!!" in (device_root / ".emu/atcid.log").read_text()
             return
-        assert emulator.wait_for_log(device_root / ".emu/atcid.log", "start accept", proc)
+        assert emulator.wait_for_log(device_root / ".emu/atcid.log", "start accept", proc,
+                                     timeout=PATIENCE)
         assert listening_address(port) == address
     finally:
         proc.kill()
@@ -144,7 +145,7 @@ def test_tcp_listen_address(device_root, listen, address):
 
 def test_tcp_blocks_are_padded_and_paced(tcp_phone):
     tcp_phone.send(UNSPECIFIED + b"=1")
-    tcp_phone.sock.settimeout(5)
+    tcp_phone.sock.settimeout(PATIENCE)
     data = b""
     block_arrival = {}
     while len(data) < 3 * BLOCK:
@@ -220,7 +221,7 @@ def test_port_selection(device_root, cmdline, kroem, expected):
 def run_daemon(root):
     """Runs the daemon on `root` until it ends by itself; returns its status."""
     with open(root / ".emu/atcid.log", "ab") as log:
-        return emulator.start_daemon(BINARY, root, log=log).wait(timeout=10)
+        return emulator.start_daemon(BINARY, root, log=log).wait(timeout=PATIENCE)
 
 
 def test_usb_port_that_cannot_open(device_root):
@@ -233,7 +234,7 @@ def test_usb_port_that_cannot_open(device_root):
 
 def test_missing_root_is_refused():
     env = {k: v for k, v in os.environ.items() if k != "ATCID_ROOT"}
-    result = subprocess.run([str(BINARY)], env=env, capture_output=True, timeout=10)
+    result = subprocess.run([str(BINARY)], env=env, capture_output=True, timeout=PATIENCE)
     assert result.returncode != 0
     assert b"ATCID_ROOT" in result.stderr
 

@@ -14,7 +14,7 @@ import time
 import pytest
 
 import emulator
-from conftest import BINARY, SOURCE, free_port
+from conftest import BINARY, PATIENCE, SOURCE, free_port
 
 EMERGENCY = b"ATD112;"
 
@@ -27,7 +27,7 @@ def install_script(root, name, body):
     path.chmod(0o755)
 
 
-def read_pipe(fd, wanted=None, timeout=10.0):
+def read_pipe(fd, wanted=None, timeout=PATIENCE):
     """Reads a non-blocking pipe until `wanted` arrived, or with no `wanted` until its end;
     returns what was read, and None in place of an end that never came."""
     data = b""
@@ -93,11 +93,11 @@ def test_shell_reboot_ends_the_daemon(tcp_phone, command, request_line):
     assert (root / ".emu/power.log").read_text() == request_line
 
 
-def connect(port, timeout=20.0):
+def connect(port, timeout=PATIENCE):
     deadline = time.monotonic() + timeout
     while True:
         try:
-            return socket.create_connection(("127.0.0.1", port), timeout=10)
+            return socket.create_connection(("127.0.0.1", port), timeout=PATIENCE)
         except OSError:
             if time.monotonic() > deadline:
                 raise
@@ -119,11 +119,11 @@ def test_launcher_serves_one_station_after_another(device_root):
         with connect(port) as station:
             station.sendall(EMERGENCY)
             assert station.recv(100) == b""
-        assert launcher.wait(timeout=20) == 0
+        assert launcher.wait(timeout=PATIENCE) == 0
         assert (device_root / ".emu/power.log").read_text() == "restart\n"
         assert (device_root / ".emu/atcid.log").read_text().count(
             "The station closed the connection") == 2
     finally:
         if launcher.poll() is None:
             launcher.send_signal(signal.SIGTERM)
-            launcher.wait(timeout=20)
+            launcher.wait(timeout=PATIENCE)

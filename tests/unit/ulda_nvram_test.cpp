@@ -3,21 +3,40 @@
 #include <chrono>
 #include <csignal>
 #include <cstring>
+#include <fcntl.h>
 #include <functional>
 #include <optional>
 #include <random>
+#include <poll.h>
 #include <set>
 #include <string>
 #include <sys/prctl.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
 
+#include "platform/unique_fd.h"
+#include "services/file_io.h"
 #include "tests/unit/device_root.h"
 
 namespace {
 
 constexpr char kRecord[] = "/persist/ulda_nvram";
+constexpr auto kPatience = std::chrono::seconds(30);
+
+// Hands `bytes` to the next reader of the FIFO at `path` and waits until it has closed it.
+bool serve_next_reader(const std::string& path, const std::string& bytes) {
+  const auto deadline = std::chrono::steady_clock::now() + kPatience;
+  UniqueFd fd;
+  while (!(fd = UniqueFd(::open(path.c_str(), O_WRONLY | O_NONBLOCK))).ok()) {
+    if (errno != ENXIO || std::chrono::steady_clock::now() > deadline) return false;
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  ::fcntl(fd.get(), F_SETFL, 0);
+  pollfd reader_gone{fd.get(), 0, 0};
+  return write_full(fd.get(), bytes.data(), bytes.size()) && ::poll(&reader_gone, 1, 30000) == 1;
+}
 
 class UldaNvramTest : public DeviceRootTest {
  protected:
@@ -148,13 +167,18 @@ TEST_F(UldaNvramTest, AdbFlagPoll) {
   write_file(kRecord, set);
   EXPECT_EQ(poll_adb_flag_cleared(), -1);
 
-  // The flag reads back 0 only on a later try.
+  // The flag reads back 0 only on a later try: the record is a FIFO that serves each read in
+  // turn, so the order holds however late either thread runs.
+  std::filesystem::remove(host_path(kRecord));
+  ASSERT_EQ(::mkfifo(host_path(kRecord).c_str(), 0600), 0);
+  bool served = false;
   std::thread clearer([&] {
-    std::this_thread::sleep_for(std::chrono::milliseconds(150));
-    write_file(kRecord, cleared);
+    served = serve_next_reader(host_path(kRecord), set) &&
+             serve_next_reader(host_path(kRecord), cleared);
   });
   EXPECT_EQ(poll_adb_flag_cleared(), 0);
   clearer.join();
+  EXPECT_TRUE(served);
 }
 
 // A writer killed at random moments: every read sees one whole record, never a mix and never
@@ -171,6 +195,8 @@ TEST_F(UldaNvramTest, KilledWriterNeverLeavesATornRecord) {
   std::set<int> seen;
   int reads = 0;
   for (int round = 0; round < 30; ++round) {
+    int wrote[2];
+    ASSERT_EQ(::pipe2(wrote, O_CLOEXEC), 0);
     const pid_t writer = ::fork();
     ASSERT_GE(writer, 0);
     if (writer == 0) {
@@ -179,12 +205,21 @@ TEST_F(UldaNvramTest, KilledWriterNeverLeavesATornRecord) {
       for (int i = 0; i < 100000; ++i) {
         std::memset(&mine, 1 + (round * 7 + i) % 250, sizeof mine);
         put_ULDA_NV_item(&mine);
+        if (i == 0) [[maybe_unused]]
+          const ssize_t n = ::write(wrote[1], "w", 1);
       }
       _exit(0);
     }
-    const auto kill_at = std::chrono::steady_clock::now() +
-                         std::chrono::microseconds(random() % 20000);
+    ::close(wrote[1]);
+    UniqueFd first_write(wrote[0]);
+    ::fcntl(first_write.get(), F_SETFL, O_NONBLOCK);
+    // The kill lands at a random moment after the writer's first record, however late it runs.
+    const auto give_up = std::chrono::steady_clock::now() + kPatience;
+    std::optional<std::chrono::steady_clock::time_point> kill_at;
     do {
+      char byte;
+      if (!kill_at && ::read(first_write.get(), &byte, 1) == 1)
+        kill_at = std::chrono::steady_clock::now() + std::chrono::microseconds(random() % 20000);
       ulda_nvram read;
       ASSERT_EQ(get_ULDA_NV_item(&read), 0) << "read " << reads;
       const auto* bytes = reinterpret_cast<const uint8_t*>(&read);
@@ -192,7 +227,7 @@ TEST_F(UldaNvramTest, KilledWriterNeverLeavesATornRecord) {
         ASSERT_EQ(bytes[i], bytes[0]) << "torn at byte " << i << " of read " << reads;
       seen.insert(bytes[0]);
       ++reads;
-    } while (std::chrono::steady_clock::now() < kill_at);
+    } while (std::chrono::steady_clock::now() < kill_at.value_or(give_up));
     ::kill(writer, SIGKILL);
     int status = 0;
     ASSERT_EQ(::waitpid(writer, &status, 0), writer);
