@@ -1,0 +1,21 @@
+// Worker threads of the command families: plain pthreads stopped through global flags.
+#pragma once
+
+#include <pthread.h>
+
+// Starts `body` on a new thread, joinable or detached. 0, or the pthread error; `handle` is
+// set only on success.
+int start_worker(pthread_t* handle, void (*body)(), bool detached);
+
+// Held by a worker around each cycle's device and port work, never across its sleep. Once the
+// process has begun to exit no cycle begins or is left half done: the worker waits there and
+// the process ends under it, so no worker touches what exit destroys (the log, the root).
+struct WorkerCycle {
+  WorkerCycle();
+  ~WorkerCycle();
+  WorkerCycle(const WorkerCycle&) = delete;
+  WorkerCycle& operator=(const WorkerCycle&) = delete;
+};
+
+// Workers started and not yet returned; tests wait on it.
+int running_workers();
