@@ -26,6 +26,8 @@ void* run_worker(void* arg) {
 
 }  // namespace
 
+ThreadCreate worker_thread_create = pthread_create;
+
 WorkerCycle::WorkerCycle() { pthread_rwlock_rdlock(&g_cycle_lock); }
 WorkerCycle::~WorkerCycle() { pthread_rwlock_unlock(&g_cycle_lock); }
 
@@ -37,7 +39,7 @@ int start_worker(pthread_t* handle, void (*body)(), bool detached) {
   if (detached) pthread_attr_setdetachstate(&attr, PTHREAD_CREATE_DETACHED);
   g_running.fetch_add(1);
   pthread_t thread;
-  const int error = pthread_create(&thread, &attr, run_worker, reinterpret_cast<void*>(body));
+  const int error = worker_thread_create(&thread, &attr, run_worker, reinterpret_cast<void*>(body));
   pthread_attr_destroy(&attr);
   if (error != 0) {
     g_running.fetch_sub(1);

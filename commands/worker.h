@@ -19,3 +19,7 @@ struct WorkerCycle {
 
 // Workers started and not yet returned; tests wait on it.
 int running_workers();
+
+// How threads are created; tests replace it to make creation fail.
+using ThreadCreate = int (*)(pthread_t*, const pthread_attr_t*, void* (*)(void*), void*);
+extern ThreadCreate worker_thread_create;
