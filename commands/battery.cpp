@@ -6,7 +6,6 @@
 #include <cstring>
 #include <fcntl.h>
 #include <string_view>
-#include <unistd.h>
 
 #include "commands/command_util.h"
 #include "commands/worker.h"
@@ -67,12 +66,7 @@ bool write_adc_line() {
   return true;
 }
 
-void adc_stream_body() {
-  while (!eadc_test_exit) {
-    if (!write_adc_line()) return;
-    ::usleep(300000);
-  }
-}
+void adc_stream_body() { run_stream(eadc_test_exit, write_adc_line, 300000); }
 
 // Charger controls: write-only, created in an existing directory, truncated.
 struct ChargerWrite {

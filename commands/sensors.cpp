@@ -5,7 +5,6 @@
 #include <climits>
 #include <cmath>
 #include <cstdio>
-#include <unistd.h>
 
 #include "commands/command_util.h"
 #include "commands/worker.h"
@@ -65,12 +64,7 @@ bool write_z_line() {
   return true;
 }
 
-void gsensor_z_body() {
-  while (!gsensor_test_exit) {
-    if (!write_z_line()) return;
-    ::usleep(200000);
-  }
-}
+void gsensor_z_body() { run_stream(gsensor_test_exit, write_z_line, 200000); }
 
 int gsensor_calibrate() {
   sensor_test_result result;

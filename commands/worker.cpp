@@ -3,6 +3,7 @@
 #include <atomic>
 #include <cstdlib>
 #include <mutex>
+#include <unistd.h>
 
 #include "core/log.h"
 
@@ -48,6 +49,13 @@ int start_worker(pthread_t* handle, void (*body)(), bool detached) {
   }
   *handle = thread;
   return 0;
+}
+
+void run_stream(const std::atomic<bool>& exit, bool (*cycle)(), unsigned period_us) {
+  while (!exit) {
+    if (!cycle()) return;
+    ::usleep(period_us);
+  }
 }
 
 int running_workers() { return g_running.load(); }
