@@ -1,10 +1,15 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/amplifier.h"
+#include "commands/audio_path.h"
 #include "commands/battery.h"
+#include "commands/clock_language.h"
 #include "commands/device_info.h"
 #include "commands/display.h"
+#include "commands/identity.h"
 #include "commands/lights.h"
+#include "commands/operator.h"
 #include "commands/sensors.h"
 #include "commands/storage.h"
 
@@ -15,7 +20,7 @@ constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
 constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCN", kSetOrAction, pending_family_handler},
     {"AT+ETST", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVSJ", kSetOrAction, pending_family_handler},
+    {"AT+JVSJ", kSetOrAction, get_system_time_handler},
     {"AT+JVMMIUI", kSetOrAction, pending_family_handler},
     {"AT+JVSP", kSetOrAction, jvsp_handler},
     {"AT+JVBS", kSetOrAction, jvbs_handler},
@@ -24,7 +29,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+EQSB", kSetOrAction, eqsb_handler},
     {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, pending_family_handler},
-    {"AT+JVXL", kSetOrAction, pending_family_handler},
+    {"AT+JVXL", kSetOrAction, play_ring_handler},
     {"AT+ESLP", kSetOrAction, eslp_handler},
     {"AT+JVKJ", kSetOrAction, pending_family_handler},
     {"AT+JVDL", kSetOrAction, pending_family_handler},
@@ -33,7 +38,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVTWST", kSetOrAction, jvtwst_handler},
     {"AT+JVSIM", kSetOrAction, jvsim_handler},
     {"AT+JVSD", kSetOrAction, jvsd_handler},
-    {"AT+JVMP", kSetOrAction, pending_family_handler},
+    {"AT+JVMP", kSetOrAction, play_media_handler},
     {"AT+JVTR", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVNC", kSetOrAction, pending_family_handler},
     {"AT+JVDLJ", kSetOrAction, jvdlj_handler},
@@ -42,7 +47,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVUDWR", kSetOrAction, jvudwr_handler},
     {"AT+JVUDROOM", kSetOrAction, jvudroom_handler},
     {"AT+JVRDNV", kSetOrAction, pending_family_handler},
-    {"AT+JVMD", kSetOrAction, pending_family_handler},
+    {"AT+JVMD", kSetOrAction, ring_test_handler},
     {"AT+JVCHARGE", kSetOrAction, jvcharge_handler},
     {"AT+JVCHARG", kSetOrAction, jvcharg_handler},
     {"AT+RMCHARGEP", kSetOrAction, rmchargep_handler},
@@ -53,9 +58,9 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVHALL", kSetOrAction, jvhall_handler},
     {"AT+JVTESTMMI", kSetOrAction, pending_family_handler},
     {"AT+JV3G", kSetOrAction, pending_family_handler},
-    {"AT+JVOPTR", kSetOrAction, pending_family_handler},
+    {"AT+JVOPTR", kSetOrAction, optr_flag_handler},
     {"AT+JVUPDATE", kSetOrAction, pending_family_handler},
-    {"AT+JVOEM", kSetOrAction, pending_family_handler},
+    {"AT+JVOEM", kSetOrAction, check_oem_handler},
     {"AT+JVMODEL", kSetOrAction, jvmodel_handler},
     {"AT+JVLCD", kSetOrAction, jvlcd_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
@@ -83,7 +88,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSFT", kSetOrAction, pending_family_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
-    {"AT+ZNGF", kSetOrAction, pending_family_handler},
+    {"AT+ZNGF", kSetOrAction, smart_speaker_Amplifier_calibrate_handler},
     {"AT+JVSYJM", kSetOrAction, pending_family_handler},
     {"AT+JVSSID", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVSEBOOT", kSetOrAction, jvseboot_handler},
@@ -92,29 +97,29 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCARD", kSetOrAction, jvcard_handler},
     {"AT+JVGMQH", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+UPDATEAPPS", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLC", kSetOrAction, pending_family_handler},
+    {"AT+JVLC", kSetOrAction, set_language_handler},
     {"AT+JVRIC", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+SGDJZ", kSetOrAction, sgdjz_handler},
     {"AT+JVCCM", kSetOrAction, jvccm_handler},
     {"AT+ONLINE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLANGUAGE", kSetOrAction, pending_family_handler},
+    {"AT+JVLANGUAGE", kSetOrAction, set_default_language_handler},
     {"AT+JVFLIGHT", kSetOrAction, jvflight_handler},
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
-    {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
+    {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
-    {"AT+PEMUKP", kSetOrAction, pending_family_handler},
+    {"AT+PEMUKP", kSetOrAction, RSA_key_handler},
     {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
     {"AT+JVDW", kSetOrAction, pending_family_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVPROP", kSetOrAction, pending_family_handler},
+    {"AT+JVPROP", kSetOrAction, property_set_handler},
     {"AT+JVSIMT", kSetOrAction, pending_family_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, eadc_handler},
-    {"AT+EALT", kSetOrAction, pending_family_handler},
-    {"AT+EGMR", kSetOrAction, pending_family_handler},
+    {"AT+EALT", kSetOrAction, mic_echo_handler},
+    {"AT+EGMR", kSetOrAction, imei_and_pcb_code_on_handler},
     {"AT+EMBT", kSetOrAction, pending_family_handler},
     {"AT+JVWLAN", kSetOrAction, pending_family_handler},
     {"AT+JVGPS", kSetOrAction, pending_family_handler},
@@ -131,32 +136,32 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSG", kSetOrAction, jvsg_handler},
     {"AT+MMILED", kSetOrAction, mmiled_handler},
     {"AT+JVCOM", kSetOrAction, pending_family_handler},
-    {"AT+JVMT", kSetOrAction, pending_family_handler},
-    {"AT+JVTDNV", kSetOrAction, pending_family_handler},
+    {"AT+JVMT", kSetOrAction, echo_handler},
+    {"AT+JVTDNV", kSetOrAction, nv_66024_handler},
     {"AT+JVLOGAT", kSetOrAction, pending_family_handler},
     {"AT+JVQHZS", kSetOrAction, pending_family_handler},
     {"AT+JVLIGHT", kSetOrAction, jvlight_handler},
     {"AT+JVQLOG", kSetOrAction, pending_family_handler},
-    {"AT+JVMTE", kSetOrAction, pending_family_handler},
-    {"AT+JVMTER", kSetOrAction, pending_family_handler},
-    {"AT+JVVMTEL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTS", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSA", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTRA", kSetOrAction, pending_family_handler},
+    {"AT+JVMTE", kSetOrAction, dual_mic_to_headset_handler},
+    {"AT+JVMTER", kSetOrAction, main_mic_to_headset_right_handler},
+    {"AT+JVVMTEL", kSetOrAction, sub_mic_to_headset_left_handler},
+    {"AT+JVEMTS", kSetOrAction, headset_to_speaker_handler},
+    {"AT+JVEMTR", kSetOrAction, headset_to_earpiece_handler},
+    {"AT+JVEMTSR", kSetOrAction, headset_to_right_speaker_handler},
+    {"AT+JVEMTSL", kSetOrAction, headset_to_left_speaker_handler},
+    {"AT+JVEMTSA", kSetOrAction, headset_to_speaker_with_gain_handler},
+    {"AT+JVEMTRA", kSetOrAction, headset_to_earpiece_with_gain_handler},
     {"AT+JVDISRECHARGE", kSetOrAction, jvdisrecharge_handler},
     {"AT+JVZFTX", kSetOrAction, pending_family_handler},
     {"AT+JVMEID", kSetOrAction, pending_family_handler},
     {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, jvdljcs_handler},
-    {"AT+JVSYS", kSetOrAction, pending_family_handler},
+    {"AT+JVSYS", kSetOrAction, change_sig_system_handler},
     {"AT+JVEFS", kSetOrAction, pending_family_handler},
     {"AT+JVVSIM", kSetOrAction, pending_family_handler},
     {"AT+JVDPDT", kSetOrAction, pending_family_handler},
     {"AT+JVFILE", kSetOrAction, pending_family_handler},
-    {"AT+JVKTV", kSetOrAction, pending_family_handler},
+    {"AT+JVKTV", kSetOrAction, ktv_test_handler},
 };
 
 int pending_family_handler(char*, int, char*) { return RESULT_NOT_IMPLEMENTED; }
