@@ -182,3 +182,12 @@ def test_long_line_ends_the_daemon_while_workers_run(request, kind):
     phone.receive(quiet=0.5, timeout=2)
     phone.send(b"AT+NOTHERE=" + b"X" * 189 + (b"\n" if kind == "usb" else b""))
     assert phone.wait(timeout=20) == 0
+
+
+def test_lost_port_ends_the_daemon_while_streams_run(usb_phone):
+    for line in (b"AT+EADC=1", b"AT+JVZLJC=0,1", b"AT+EDFT=6,1"):
+        usb_phone.send(line + b"\n")
+        time.sleep(0.05)
+    read_tty_until(usb_phone, lambda d: len(ADC_LINE.findall(d)) >= 2)
+    usb_phone.bridge.hang_up()
+    assert usb_phone.wait(timeout=20) == 1
