@@ -1,6 +1,12 @@
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <chrono>
+#include <fcntl.h>
 #include <string>
+#include <sys/stat.h>
+#include <thread>
+#include <unistd.h>
 #include <utility>
 #include <vector>
 
@@ -167,6 +173,34 @@ TEST_F(Lights, DisplayOnTheUartKeepsTheFrameBufferAndBlanksIt) {
   EXPECT_EQ(call_handler(edft_handler, "AT+EDFT=0,5").status, RESULT_OK);
   EXPECT_EQ(shell_commands().size(), 3u);
   EXPECT_EQ(read_file(kLcd), "255");
+}
+
+// The node is a pipe here, so both writes show, in order.
+TEST_F(Lights, BacklightOffGoesFullBrightnessFirst) {
+  make_dir("/sys/class/leds/lcd-backlight");
+  const std::string fifo = host_path(kLcd).string();
+  ASSERT_EQ(::mkfifo(fifo.c_str(), 0600), 0);
+  std::atomic<bool> done{false}, finished{false};
+  std::string seen;
+  std::thread reader([&] {
+    while (!done) {
+      const int fd = ::open(fifo.c_str(), O_RDONLY);
+      if (fd < 0) break;
+      char buf[16];
+      for (ssize_t n; (n = ::read(fd, buf, sizeof buf)) > 0;) seen.append(buf, n);
+      ::close(fd);
+    }
+    finished = true;
+  });
+  EXPECT_EQ(call_handler(edft_handler, "AT+EDFT=0,0").status, RESULT_OK);
+  done = true;
+  while (!finished) {  // releases a reader waiting for a writer that will not come
+    const int fd = ::open(fifo.c_str(), O_WRONLY | O_NONBLOCK);
+    if (fd >= 0) ::close(fd);
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  reader.join();
+  EXPECT_EQ(seen, "2550");
 }
 
 TEST_F(Lights, FlashCalibrationResult) {
