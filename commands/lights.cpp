@@ -271,7 +271,8 @@ constexpr FlashVariant kFlashVariants[] = {
 int jvsg_handler(char* cmdline, int, char*) {
   for (const FlashVariant& v : kFlashVariants) {
     if (!line_is(cmdline, v.variant)) continue;
-    if (v.setter == nullptr) return result_of(write_int("/sys/ext_led/EXT_FLASH_LED", v.state) == 0);
+    if (v.setter == nullptr)
+      return result_of(write_int("/sys/ext_led/EXT_FLASH_LED", v.state) == 0);
     return result_of(v.setter(v.state) != 0);
   }
   return REJECT_COMMAND_LINE(cmdline);
