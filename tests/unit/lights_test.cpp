@@ -53,10 +53,8 @@ std::vector<LightCase> light_cases() {
   const int ERR = RESULT_ERROR;
   return {
       {"button_on", edft_handler, "AT+EDFT=5,1", "", OK, {{kButton, "255"}}},
-      {"button_off", edft_handler, "at+edft=5,0", "", OK, {{kButton, "0"}}},
       {"lcd_full", edft_handler, "AT+EDFT=0,5", "", OK, {{kLcd, "255"}}},
       {"lcd_level", edft_handler, "AT+EDFT=0,5,128", "", OK, {{kLcd, "128"}}},
-      {"lcd_level_255", edft_handler, "AT+EDFT=0,5,0255", "", OK, {{kLcd, "255"}}},
       {"lcd_level_300", edft_handler, "AT+EDFT=0,5,300", "", ERR, {}},
       {"lcd_level_negative", edft_handler, "AT+EDFT=0,5,-1", "", ERR, {}},
       {"lcd_level_letter", edft_handler, "AT+EDFT=0,5,12A", "", ERR, {}},
@@ -69,7 +67,6 @@ std::vector<LightCase> light_cases() {
 
       {"leds_off", mmiled_handler, "AT+MMILED=1,0", "", OK, {{kLeds + "red/brightness", "0"}, {kLeds + "green/brightness", "0"}}},
       {"leds_off_led_model", mmiled_handler, "AT+MMILED=1,0", "QM0305LG4", OK, {{kEngineering, "0"}}},
-      {"red", mmiled_handler, "AT+MMILED=1,1", "", OK, {{kLeds + "red/brightness", "100"}}},
       {"green", mmiled_handler, "AT+MMILED=1,2", "", OK, {{kLeds + "green/brightness", "100"}}},
       {"green_led_model", mmiled_handler, "AT+MMILED=1,2", "QM0305", OK, {{kEngineering, "255"}}},
       {"blue", mmiled_handler, "AT+MMILED=1,3", "", OK, {{kLeds + "blue/brightness", "100"}}},
@@ -77,10 +74,8 @@ std::vector<LightCase> light_cases() {
 
       {"front_flash_2", jvsg_handler, "AT+JVSG=2", "", OK, {{kFront, "2"}}},
       {"white_on", jvsg_handler, "AT+JVSG=1,1", "", OK, {{kWhite, "40"}}},
-      {"white_off", jvsg_handler, "AT+JVSG=0,1", "", OK, {{kWhite, "0"}}},
       {"warm_on", jvsg_handler, "AT+JVSG=1,2", "", OK, {{kWarm, "40"}}},
       {"front_on", jvsg_handler, "AT+JVSG=1,3", "", OK, {{kFront, "1"}}},
-      {"front_off", jvsg_handler, "AT+JVSG=0,3", "", OK, {{kFront, "0"}}},
       {"flash_other", jvsg_handler, "AT+JVSG=3", "", ERR, {}},
   };
 }

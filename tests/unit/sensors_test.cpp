@@ -49,20 +49,16 @@ std::vector<SensorCase> sensor_cases() {
       {"accel_calibrate", jvzljc_handler, "AT+JVZLJC=0,5", {{"48", pass("1.9 -2.9 9.99")}}, {}, OK, "", {{0, 1}, {76, 1}, {80, -2}, {84, 9}}, {{"persist.sys.gs_cal_flag", "0"}}},
       {"accel_calibrate_failed", jvzljc_handler, "AT+JVZLJC=0,5", {{"48", kFail}}, {}, ERR, "", {}, gs_failed},
       {"accel_flag", jvzljc_handler, "AT+JVZLJC=0,2", {}, {{0, 7}}, OK, "\"7\"\r\n", {{0, 7}}, {}},
-      {"accel_self_test", jvzljc_handler, "AT+JVZLJC=0,6", {{"51", pass("")}}, {}, OK, "", {}, {}},
       {"accel_self_test_failed", jvzljc_handler, "AT+JVZLJC=0,6", {{"51", kFail}}, {}, ERR, "", {}, {}},
       {"accel_other", jvzljc_handler, "AT+JVZLJC=0,4", {}, {}, ERR, "", {}, {}},
 
       {"mag_1", jvdzlp_handler, "AT+JVDZLP=1", {{"67", pass("1 2 3")}}, {}, OK, "\"1,2,3\"\r\n", {}, {}},
-      {"mag_2", jvdzlp_handler, "AT+JVDZLP=2", {{"65", pass("4 5 6")}}, {}, OK, "\"4,5,6\"\r\n", {}, {}},
       {"mag_3_trailing", jvdzlp_handler, "AT+JVDZLP=3,XYZ", {{"64", pass("7 8 9")}}, {}, OK, "\"7,8,9\"\r\n", {}, {}},
       {"mag_failed", jvdzlp_handler, "AT+JVDZLP=1", {{"67", kFail}}, {}, ERR, "", {}, gs_failed},
       {"mag_4_failed", jvdzlp_handler, "AT+JVDZLP=4", {{"66", kFail}}, {}, ERR, "", {}, {}},
-      {"mag_0", jvdzlp_handler, "AT+JVDZLP=0", {{"68", pass("")}}, {}, OK, "", {}, {}},
       {"mag_other", jvdzlp_handler, "AT+JVDZLP=5", {}, {}, ERR, "", {}, {}},
 
       {"prox_calibrate", jvhwkj_handler, "AT+JVHWKJ=1", {{"32", pass("123.9")}}, {}, OK, "\"123\"\r\n", {{68, 123}, {96, 1}}, {{"persist.sys.base_threshold_prox", "123"}, {"persist.sys.ps_cali_flag", "1"}}},
-      {"prox_calibrate_failed", jvhwkj_handler, "AT+JVHWKJ=1", {{"32", kFail}}, {}, ERR, "", {}, {}},
       {"prox_reading", jvhwkj_handler, "AT+JVHWKJ=2", {{"33", pass("88.6")}}, {{68, 40}}, OK, "\"89,40\"\r\n", {{68, 40}}, {}},
       {"prox_near", jvhwkj_handler, "AT+JVHWKJ=3", {{"37", pass("0.7")}}, {}, OK, "", {}, {}},
       {"prox_away", jvhwkj_handler, "AT+JVHWKJ=3", {{"37", pass("1")}}, {}, ERR, "", {}, {}},
@@ -76,7 +72,6 @@ std::vector<SensorCase> sensor_cases() {
       {"light_self_test", jvgm_handler, "AT+JVGM=0", {{"18", kFail}}, {}, ERR, "", {}, {}},
 
       {"gyro_calibrate", jvtly_handler, "AT+JVTLY=0", {{"80", pass("-0.5 3e10 nan")}}, {}, OK, "", {{120, 1}, {124, 0}, {128, INT_MAX}, {132, 0}}, {}},
-      {"gyro_self_test", jvtly_handler, "AT+JVTLY=2", {{"83", pass("")}}, {}, OK, "", {}, {}},
       {"gyro_other", jvtly_handler, "AT+JVTLY=1", {}, {}, ERR, "", {}, {}},
   };
 }
