@@ -8,3 +8,12 @@
 inline const pthread_t NO_THREAD = static_cast<pthread_t>(-1);
 extern std::atomic<pthread_t> adc_test_thread;
 extern std::atomic<bool> eadc_test_exit;
+
+int eadc_handler(char* cmdline, int op, char* response);
+int jvdlj_handler(char* cmdline, int op, char* response);
+int jvcharge_handler(char* cmdline, int op, char* response);
+int jvcharg_handler(char* cmdline, int op, char* response);
+int rmchargep_handler(char* cmdline, int op, char* response);
+int jvqxgwbh_handler(char* cmdline, int op, char* response);
+int jvdisrecharge_handler(char* cmdline, int op, char* response);
+int jvdljcs_handler(char* cmdline, int op, char* response);

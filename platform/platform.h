@@ -57,3 +57,12 @@ int platform_tcp_port();
 // IPv4 address (network byte order) the socket transport listens on: all interfaces on the
 // phone. 0, or -1 when the configured address is not usable.
 int platform_tcp_listen_address(uint32_t* address);
+
+// Android wake locks (libhardware_legacy). 0, or -1 when the request could not be made.
+inline constexpr int PARTIAL_WAKE_LOCK = 1;
+int acquire_wake_lock(int type, const char* name);
+int release_wake_lock(const char* name);
+
+// The frame buffer's blank request (FBIOBLANK) on an open frame-buffer descriptor: 0, or -1.
+inline constexpr int FB_BLANK_POWERDOWN = 4;
+int platform_fb_blank(int fd, int mode);
