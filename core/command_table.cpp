@@ -1,8 +1,10 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/cellular.h"
 #include "commands/device_info.h"
 #include "commands/storage.h"
+#include "commands/wlan.h"
 
 namespace {
 constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
@@ -16,7 +18,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSP", kSetOrAction, pending_family_handler},
     {"AT+JVBS", kSetOrAction, pending_family_handler},
     {"AT+LCMT", kSetOrAction, pending_family_handler},
-    {"AT+OFFL", kSetOrAction, pending_family_handler},
+    {"AT+OFFL", kSetOrAction, plan_mode_test_handler},
     {"AT+EQSB", kSetOrAction, pending_family_handler},
     {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, pending_family_handler},
@@ -56,27 +58,27 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVLCD", kSetOrAction, pending_family_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVG3G", kSetOrAction, pending_family_handler},
-    {"AT+JVSB3G", kSetOrAction, pending_family_handler},
-    {"AT+JVSBDT", kSetOrAction, pending_family_handler},
+    {"AT+JVSB3G", kSetOrAction, status_bar_3g_handler},
+    {"AT+JVSBDT", kSetOrAction, status_bar_data_handler},
     {"AT+JVSDCALI", kSetOrAction, jvsdcali_handler},
     {"AT+JVUSB", kSetOrAction, jvusb_handler},
     {"AT+JVSJZLB", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVQXGWBH", kSetOrAction, pending_family_handler},
-    {"AT+JVNFC", kSetOrAction, pending_family_handler},
+    {"AT+JVNFC", kSetOrAction, nfc_tag_handler},
     {"AT+JVRID", kSetOrAction, jvrid_handler},
-    {"AT+JVSWXFK", kSetOrAction, pending_family_handler},
+    {"AT+JVSWXFK", kSetOrAction, fast_search_net_handler},
     {"AT+JVLCMID", kSetOrAction, jvlcmid_handler},
     {"AT+JVCCMID", kSetOrAction, jvccmid_handler},
     {"AT+JVPID", kSetOrAction, jvpid_handler},
     {"AT+JVRAM", kSetOrAction, jvram_handler},
-    {"AT+JVRADIO", kSetOrAction, pending_family_handler},
+    {"AT+JVRADIO", kSetOrAction, radio_type_handler},
     {"AT+JVCKIC", kSetOrAction, jvckic_handler},
     {"AT+JVBBTYPE", kSetOrAction, jvbbtype_handler},
     {"AT+JVRTALL", kSetOrAction, pending_family_handler},
     {"AT+JVLOG", kSetOrAction, pending_family_handler},
     {"AT+MMICCM", kSetOrAction, pending_family_handler},
     {"AT+MMITW", kSetOrAction, pending_family_handler},
-    {"AT+JVSFT", kSetOrAction, pending_family_handler},
+    {"AT+JVSFT", kSetOrAction, fast_search_test_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
     {"AT+ZNGF", kSetOrAction, pending_family_handler},
@@ -101,20 +103,20 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
-    {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
+    {"AT+JVCONNWIFI", kSetOrAction, conn_wifi_handler},
     {"AT+JVDW", kSetOrAction, pending_family_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVPROP", kSetOrAction, pending_family_handler},
-    {"AT+JVSIMT", kSetOrAction, pending_family_handler},
+    {"AT+JVSIMT", kSetOrAction, set_sim2_status_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
     {"AT+EALT", kSetOrAction, pending_family_handler},
     {"AT+EGMR", kSetOrAction, pending_family_handler},
     {"AT+EMBT", kSetOrAction, pending_family_handler},
-    {"AT+JVWLAN", kSetOrAction, pending_family_handler},
+    {"AT+JVWLAN", kSetOrAction, wifi_handler},
     {"AT+JVGPS", kSetOrAction, pending_family_handler},
-    {"AT+JVWMAC", kSetOrAction, pending_family_handler},
+    {"AT+JVWMAC", kSetOrAction, wlan_addr_handler},
     {"AT+JVZLJC", kSetOrAction, pending_family_handler},
     {"AT+JVDZLP", kSetOrAction, pending_family_handler},
     {"AT+JVHWKJ", kSetOrAction, pending_family_handler},
@@ -143,14 +145,14 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVEMTSA", kSetOrAction, pending_family_handler},
     {"AT+JVEMTRA", kSetOrAction, pending_family_handler},
     {"AT+JVDISRECHARGE", kSetOrAction, pending_family_handler},
-    {"AT+JVZFTX", kSetOrAction, pending_family_handler},
-    {"AT+JVMEID", kSetOrAction, pending_family_handler},
+    {"AT+JVZFTX", kSetOrAction, primary_or_diversity_handler},
+    {"AT+JVMEID", kSetOrAction, meid_code_handler},
     {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, pending_family_handler},
     {"AT+JVSYS", kSetOrAction, pending_family_handler},
     {"AT+JVEFS", kSetOrAction, pending_family_handler},
-    {"AT+JVVSIM", kSetOrAction, pending_family_handler},
-    {"AT+JVDPDT", kSetOrAction, pending_family_handler},
+    {"AT+JVVSIM", kSetOrAction, virtual_sim_handler},
+    {"AT+JVDPDT", kSetOrAction, set_dpdt_status_handler},
     {"AT+JVFILE", kSetOrAction, pending_family_handler},
     {"AT+JVKTV", kSetOrAction, pending_family_handler},
 };

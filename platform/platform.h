@@ -45,3 +45,10 @@ int platform_system(const char* command);
 
 // TCP port of the socket transport.
 int platform_tcp_port();
+
+// Flushes the file systems before a restart (sync). A host build flushes only the root's.
+void platform_sync();
+
+// The FM tuner's signal strength: VIDIOC_G_TUNER for tuner 0 on the open radio device. 0 with
+// `signal` set; -1 when the tuner cannot be read (`signal` untouched).
+int platform_fm_tuner_signal(int fd, int* signal);
