@@ -1,6 +1,7 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/bluetooth.h"
 #include "commands/cellular.h"
 #include "commands/device_info.h"
 #include "commands/storage.h"
@@ -113,7 +114,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+EADC", kSetOrAction, pending_family_handler},
     {"AT+EALT", kSetOrAction, pending_family_handler},
     {"AT+EGMR", kSetOrAction, pending_family_handler},
-    {"AT+EMBT", kSetOrAction, pending_family_handler},
+    {"AT+EMBT", kSetOrAction, bt_handler},
     {"AT+JVWLAN", kSetOrAction, wifi_handler},
     {"AT+JVGPS", kSetOrAction, pending_family_handler},
     {"AT+JVWMAC", kSetOrAction, wlan_addr_handler},
