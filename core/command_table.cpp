@@ -4,6 +4,7 @@
 #include "commands/bluetooth.h"
 #include "commands/cellular.h"
 #include "commands/device_info.h"
+#include "commands/gps_fm.h"
 #include "commands/storage.h"
 #include "commands/wlan.h"
 
@@ -105,7 +106,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
     {"AT+JVCONNWIFI", kSetOrAction, conn_wifi_handler},
-    {"AT+JVDW", kSetOrAction, pending_family_handler},
+    {"AT+JVDW", kSetOrAction, locate_access_on_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVPROP", kSetOrAction, pending_family_handler},
@@ -116,14 +117,14 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+EGMR", kSetOrAction, pending_family_handler},
     {"AT+EMBT", kSetOrAction, bt_handler},
     {"AT+JVWLAN", kSetOrAction, wifi_handler},
-    {"AT+JVGPS", kSetOrAction, pending_family_handler},
+    {"AT+JVGPS", kSetOrAction, gps_handler},
     {"AT+JVWMAC", kSetOrAction, wlan_addr_handler},
     {"AT+JVZLJC", kSetOrAction, pending_family_handler},
     {"AT+JVDZLP", kSetOrAction, pending_family_handler},
     {"AT+JVHWKJ", kSetOrAction, pending_family_handler},
     {"AT+JVGM", kSetOrAction, pending_family_handler},
     {"AT+JVTLY", kSetOrAction, pending_family_handler},
-    {"AT+JVFM", kSetOrAction, pending_family_handler},
+    {"AT+JVFM", kSetOrAction, fm_test_handler},
     {"AT+JVGJ", kSetOrAction, pending_family_handler},
     {"AT+JVREBOOT", kSetOrAction, pending_family_handler},
     {"AT+JVRT", kSetOrAction, pending_family_handler},
