@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/radio_util.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -30,18 +31,6 @@ int dut_check() {
   return RESULT_OK;
 }
 
-void run_tool(const char* command) {
-  char line[CMD_LINE_SIZE + 32];
-  std::snprintf(line, sizeof line, "/system/bin/sh -c \"%s\"", command);
-  run_shell(line);
-}
-
-struct Fields {
-  explicit Fields(const char* line) : rest(line) { next_token(rest, ","); }
-  std::string_view next() { return next_token(rest, ","); }
-  std::string_view rest;
-};
-
 // Two characters per byte, first pair into byte 0; any character gives its low 4 bits after
 // the hex shift, so lower case works as upper case does.
 uint8_t nibble(char c) {
@@ -51,7 +40,7 @@ uint8_t nibble(char c) {
 }
 
 int write_address(const char* cmdline) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   fields.next();  // "BT"
   const std::string_view address = fields.next();
   if (address.empty()) {
@@ -168,7 +157,7 @@ int bt_handler(char* cmdline, int, char* response) {
     return dut_check();
   }
   if (line_starts_with(cmdline, "AT+EMBT=1")) {
-    Fields fields(cmdline);
+    CommaFields fields(cmdline);
     const std::string_view channel = fields.next();
     if (channel.empty()) {
       ATCI_LOGE("========bt_channel is NULL\n");

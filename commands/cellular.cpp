@@ -11,6 +11,7 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
+#include "commands/radio_util.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/serial.h"
@@ -28,13 +29,6 @@ constexpr const char* kKeepScreenOn = "kro.intent.action.KEEP_CREEN_ON";
 void log_cmdline(const char* caller, const char* cmdline) {
   atci_log(LOG_LVL_DEBUG, __LINE__, caller, "===========cmdline %s\r\n", cmdline);
 }
-
-// The comma-separated fields after the command itself, as strtok hands them out.
-struct Fields {
-  explicit Fields(const char* line) : rest(line) { next_token(rest, ","); }
-  std::string_view next() { return next_token(rest, ","); }
-  std::string_view rest;
-};
 
 // A field as a writable, terminated copy of at most N - 1 characters.
 template <size_t N>
@@ -132,7 +126,7 @@ int nv_read(const NvCommand& nv, char* response) {
 }
 
 int nv_write(const NvCommand& nv, const char* cmdline) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   const std::string_view field = fields.next();
   if (field.empty()) {
     ATCI_LOGE("========The wlan addr is NULL====");
@@ -219,7 +213,7 @@ int fast_search_net_handler(char* cmdline, int, char*) {
 int fast_search_test_handler(char* cmdline, int, char*) {
   log_cmdline(__func__, cmdline);
   if (line_starts_with(cmdline, "AT+JVSFT=1")) {
-    Fields fields(cmdline);
+    CommaFields fields(cmdline);
     const std::string_view sim = fields.next();
     const std::string_view act = fields.next();
     const std::string_view channel = fields.next();
@@ -304,7 +298,7 @@ int primary_or_diversity_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
   char text[sizeof return_buffer];
   if (line_starts_with(cmdline, "AT+JVZFTX=1")) {
-    Fields fields(cmdline);
+    CommaFields fields(cmdline);
     const std::string_view n = fields.next();
     if (n.empty()) return RESULT_ERROR;
     return result_of(int_request(mutuallySwitchForPrimaryAndDiversity,

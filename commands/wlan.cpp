@@ -12,6 +12,7 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
+#include "commands/radio_util.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/serial.h"
@@ -112,18 +113,12 @@ constexpr size_t kCommandSize = 100;
 constexpr const char* kLoadWlan = "insmod /system/lib/modules/wlan.ko con_mode=5 ";
 constexpr const char* kTxPowerFile = "/data/wlanTxPower";
 
-// Runs one tool command the way the phone's shell is reached: sh -c with the text quoted.
-void run(const char* command) {
-  char line[kCommandSize + 32];
-  std::snprintf(line, sizeof line, "/system/bin/sh -c \"%s\"", command);
-  run_shell(line);
-}
 
 template <typename... Args>
 void runf(const char* format, Args... args) {
   char command[kCommandSize];
   std::snprintf(command, sizeof command, format, args...);
-  run(command);
+  run_tool(command);
 }
 
 // The second ":"-field of the first line of a driver output file, at most size - 1 characters
@@ -153,15 +148,9 @@ bool read_driver_value(const char* file, size_t size, const char* missing_log, c
 
 // The power the driver reports for the current channel, as its raw integer.
 bool read_tx_power(const char* missing_log, char* value) {
-  run("iwpriv wlan0 get_chpower > /data/wlanTxPower");
+  run_tool("iwpriv wlan0 get_chpower > /data/wlanTxPower");
   return read_driver_value(kTxPowerFile, 50, missing_log, value);
 }
-
-struct Fields {
-  explicit Fields(const char* line) : rest(line) { next_token(rest, ","); }
-  std::string_view next() { return next_token(rest, ","); }
-  std::string_view rest;
-};
 
 // A field as a terminated string for the C conversions.
 struct FieldText {
@@ -212,15 +201,15 @@ int wlan_init() {
     sendBroadcastFromAtcid(nullptr, "kro.intent.action.KEEP_CREEN_ON", "-e status 2");
     ATCI_LOGD("end JVWLAN=1 KEEP_CREEN_ON 2");
   }
-  run("rmmod cfg80211");
-  run("rmmod wlan");
-  run("insmod /system/lib/modules/cfg80211.ko");
-  run("echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode");
-  run(kLoadWlan);
+  run_tool("rmmod cfg80211");
+  run_tool("rmmod wlan");
+  run_tool("insmod /system/lib/modules/cfg80211.ko");
+  run_tool("echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode");
+  run_tool(kLoadWlan);
   ::sleep(2);
   if (check_driver_loaded("wlan") == 0) {
     ATCI_LOGE("wlan modules unloaded, try to load again!");
-    run(kLoadWlan);
+    run_tool(kLoadWlan);
     ::usleep(200);
   }
   char mode[50];
@@ -231,7 +220,7 @@ int wlan_init() {
 
 // =2 (2.4 GHz, b/g rates) and =3 (wide or bonded, n/a or ac rates).
 int wlan_transmit(const char* cmdline, bool wide) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   const std::string_view channel = fields.next();
   const std::string_view rate = fields.next();
   const std::string_view power = fields.next();
@@ -252,33 +241,33 @@ int wlan_transmit(const char* cmdline, bool wide) {
 
   if (!wide && check_driver_loaded("wlan") == 0) {
     ATCI_LOGE("wlan modules unloaded, try to load!");
-    run(kLoadWlan);
+    run_tool(kLoadWlan);
     ::usleep(200);
   }
-  run("iwpriv wlan0 tx 0");
-  run("iwpriv wlan0 ftm 0");
+  run_tool("iwpriv wlan0 tx 0");
+  run_tool("iwpriv wlan0 ftm 0");
   if (!power_is_off)
     std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_txpower %d",
                   static_cast<int>(std::atof(power_text.text) * 100));
   if (!wide) ::usleep(200 * 1000);
-  run("iwpriv wlan0 ftm 1");
-  run(setup.channel_cmd);
-  run("iwpriv wlan0 ena_chain 2");
-  run(setup.rate_cmd);
-  run("iwpriv wlan0 pwr_cntl_mode 2");
+  run_tool("iwpriv wlan0 ftm 1");
+  run_tool(setup.channel_cmd);
+  run_tool("iwpriv wlan0 ena_chain 2");
+  run_tool(setup.rate_cmd);
+  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
   if (power_is_off) {
     char value[kCommandSize];
     if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
     std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_txpower %d", std::atoi(value));
   }
-  run(power_cmd);
-  run("iwpriv wlan0 tx 1");
+  run_tool(power_cmd);
+  run_tool("iwpriv wlan0 tx 1");
   return RESULT_OK;
 }
 
 // =4 (2.4 GHz, b/g rates) and =5 (wide or bonded). The rate is never set on receive.
 int wlan_receive(const char* cmdline, bool wide) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   const std::string_view channel = fields.next();
   const std::string_view rate = fields.next();
   const std::string_view bonding = wide ? fields.next() : std::string_view();
@@ -288,25 +277,25 @@ int wlan_receive(const char* cmdline, bool wide) {
   }
   RfSetup setup;
   if (!rf_setup(channel, rate, bonding, wide, setup)) return RESULT_ERROR;
-  run("iwpriv wlan0 ftm 1");
+  run_tool("iwpriv wlan0 ftm 1");
   if (wide) ::sleep(1);
-  run(setup.channel_cmd);
-  run("iwpriv wlan0 ena_chain 1");
-  run("iwpriv wlan0 pwr_cntl_mode 2");
+  run_tool(setup.channel_cmd);
+  run_tool("iwpriv wlan0 ena_chain 1");
+  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
   ATCI_LOGD("rate_cmd=%s, !!BUT AT NOT SET!!", setup.rate_cmd);
-  run("iwpriv wlan0 clr_rxpktcnt 1");
-  run("iwpriv wlan0 rx 1");
+  run_tool("iwpriv wlan0 clr_rxpktcnt 1");
+  run_tool("iwpriv wlan0 rx 1");
   return RESULT_OK;
 }
 
 int wlan_packet_count(char* response) {
   ::usleep(500 * 1000);
-  run("iwpriv wlan0 get_rxpktcnt > /data/wlanRxPER");
+  run_tool("iwpriv wlan0 get_rxpktcnt > /data/wlanRxPER");
   char value[kCommandSize];
   if (!read_driver_value("/data/wlanRxPER", 100, "===the pckcnt is NULL\r\n", value))
     return RESULT_ERROR;
   std::snprintf(response, RESPONSE_SIZE, "\"%ld\"", std::atol(value));
-  run("iwpriv wlan0 clr_rxpktcnt 1");
+  run_tool("iwpriv wlan0 clr_rxpktcnt 1");
   return RESULT_OK;
 }
 
@@ -327,7 +316,7 @@ const char* protocol_rate(std::string_view protocol) {
 }
 
 int wlan_set_power(const char* cmdline) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
   const std::string_view power = fields.next();
   if (protocol.empty()) {
@@ -349,22 +338,22 @@ int wlan_set_power(const char* cmdline) {
     if (matches("N", protocol)) ATCI_LOGE("AT+JVWLAN=SP,N,power");
     return RESULT_ERROR;
   }
-  run("iwpriv wlan0 tx 0");
-  run("iwpriv wlan0 ftm 0");
+  run_tool("iwpriv wlan0 tx 0");
+  run_tool("iwpriv wlan0 ftm 0");
   char power_cmd[kCommandSize];
   std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_chpower %d",
                 static_cast<int>(value * 100));
-  run("iwpriv wlan0 ftm 1");
-  run("iwpriv wlan0 set_channel 1");
-  run("iwpriv wlan0 ena_chain 2");
-  run(rate_cmd);
-  run("iwpriv wlan0 pwr_cntl_mode 2");
-  run(power_cmd);
+  run_tool("iwpriv wlan0 ftm 1");
+  run_tool("iwpriv wlan0 set_channel 1");
+  run_tool("iwpriv wlan0 ena_chain 2");
+  run_tool(rate_cmd);
+  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
+  run_tool(power_cmd);
   return RESULT_OK;
 }
 
 int wlan_get_power(const char* cmdline, char* response) {
-  Fields fields(cmdline);
+  CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
   if (protocol.empty()) {
     ATCI_LOGE("Parameters incomplete.");
@@ -375,11 +364,11 @@ int wlan_get_power(const char* cmdline, char* response) {
     ATCI_LOGE("temp solution,20120311 just support BGN protocol");
     return RESULT_ERROR;
   }
-  run("iwpriv wlan0 tx 0");
-  run("iwpriv wlan0 ftm 0");
-  run("iwpriv wlan0 ftm 1");
-  run("iwpriv wlan0 set_channel 1");
-  run(rate_cmd);
+  run_tool("iwpriv wlan0 tx 0");
+  run_tool("iwpriv wlan0 ftm 0");
+  run_tool("iwpriv wlan0 ftm 1");
+  run_tool("iwpriv wlan0 set_channel 1");
+  run_tool(rate_cmd);
   char value[kCommandSize];
   if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%f\"\r\n", std::atof(value) / 100);
@@ -388,8 +377,8 @@ int wlan_get_power(const char* cmdline, char* response) {
 
 int wlan_set_config(const char* cmdline) {
   killprocess("ptt_socket_app", 1);
-  run("ptt_socket_app");
-  Fields fields(cmdline);
+  run_tool("ptt_socket_app");
+  CommaFields fields(cmdline);
   const std::string_view value = fields.next();
   if (value.empty()) {
     ATCI_LOGE("Parameters configItem1 incomplete.");
@@ -400,8 +389,8 @@ int wlan_set_config(const char* cmdline) {
 }
 
 int wlan_get_config(char* response) {
-  run("iwpriv wlan0 ftm 1");
-  run("iwpriv wlan0 get_configitem > /data/wlanTxPower");
+  run_tool("iwpriv wlan0 ftm 1");
+  run_tool("iwpriv wlan0 get_configitem > /data/wlanTxPower");
   char value[kCommandSize];
   if (!read_driver_value(kTxPowerFile, 50, "===the configItem1 is NULL\r\n", value))
     return RESULT_ERROR;
@@ -432,13 +421,13 @@ int wifi_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVWLAN=5")) return wlan_receive(cmdline, true);
   if (line_starts_with(cmdline, "AT+JVWLAN=6")) return wlan_packet_count(response);
   if (line_is(cmdline, "AT+JVWLAN=7")) {
-    run("iwpriv wlan0 tx 0");
+    run_tool("iwpriv wlan0 tx 0");
     ATCI_LOGD("wifi_stop_tx called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=8")) {
-    run("iwpriv wlan0 rx 0");
-    run("iwpriv wlan0 ftm 0");
+    run_tool("iwpriv wlan0 rx 0");
+    run_tool("iwpriv wlan0 ftm 0");
     ATCI_LOGD("wifi_stop_rx called");
     return RESULT_OK;
   }
@@ -446,12 +435,12 @@ int wifi_handler(char* cmdline, int, char* response) {
     for (const char* command :
          {"iwpriv wlan0 tx 0", "iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0", "rmmod cfg80211",
           "rmmod wlan", "echo 0 > /sys/module/wcnsscore/parameters/wlan_eng_mode"})
-      run(command);
+      run_tool(command);
     ATCI_LOGD("wifi_deinit called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=10")) {
-    run("iwpriv wlan0 clr_rxpktcnt 1");
+    run_tool("iwpriv wlan0 clr_rxpktcnt 1");
     return RESULT_OK;
   }
   if (line_starts_with(cmdline, "AT+JVWLAN=SP")) return wlan_set_power(cmdline);
