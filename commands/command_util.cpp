@@ -98,3 +98,13 @@ int run_shell(const char* command) {
 bool shell_succeeded(int status) {
   return status != -1 && WIFEXITED(status) && WEXITSTATUS(status) == 0;
 }
+
+int run_sh_command(const char* text) {
+  char command[512];
+  const int n = std::snprintf(command, sizeof command, "/system/bin/sh -c \"%s\"", text);
+  if (n < 0 || static_cast<size_t>(n) >= sizeof command) {
+    ATCI_LOGE("command too long: %s", text);
+    return -1;
+  }
+  return run_shell(command);
+}

@@ -55,6 +55,12 @@ void cut_at_line_end(char* text);
 int run_shell(const char* command);
 // The shell ran the command and it exited with status 0.
 bool shell_succeeded(int status);
+// Runs `text` as /system/bin/sh -c "TEXT" and returns system()'s raw result; -1 when the
+// command would not fit.
+int run_sh_command(const char* text);
+// The raw rule for run_sh_command: failed only on -1 or 127. The wait status is not decoded,
+// so a tool the shell could not find (32512) is no failure.
+inline bool sh_command_failed(int result) { return result == -1 || result == 127; }
 
 // strtok over a view: skips leading delimiters, returns the next token (empty at the end) and
 // moves `rest` past it.

@@ -1,6 +1,8 @@
 // The daemon's whole vocabulary, searched linearly in this order.
 #include "core/command.h"
 
+#include "commands/amplifier.h"
+#include "commands/audio_path.h"
 #include "commands/bluetooth.h"
 #include "commands/cellular.h"
 #include "commands/device_info.h"
@@ -24,7 +26,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+EQSB", kSetOrAction, pending_family_handler},
     {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, pending_family_handler},
-    {"AT+JVXL", kSetOrAction, pending_family_handler},
+    {"AT+JVXL", kSetOrAction, play_ring_handler},
     {"AT+ESLP", kSetOrAction, pending_family_handler},
     {"AT+JVKJ", kSetOrAction, pending_family_handler},
     {"AT+JVDL", kSetOrAction, pending_family_handler},
@@ -33,7 +35,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVTWST", kSetOrAction, jvtwst_handler},
     {"AT+JVSIM", kSetOrAction, jvsim_handler},
     {"AT+JVSD", kSetOrAction, jvsd_handler},
-    {"AT+JVMP", kSetOrAction, pending_family_handler},
+    {"AT+JVMP", kSetOrAction, play_media_handler},
     {"AT+JVTR", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVNC", kSetOrAction, pending_family_handler},
     {"AT+JVDLJ", kSetOrAction, pending_family_handler},
@@ -42,7 +44,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVUDWR", kSetOrAction, jvudwr_handler},
     {"AT+JVUDROOM", kSetOrAction, jvudroom_handler},
     {"AT+JVRDNV", kSetOrAction, pending_family_handler},
-    {"AT+JVMD", kSetOrAction, pending_family_handler},
+    {"AT+JVMD", kSetOrAction, ring_test_handler},
     {"AT+JVCHARGE", kSetOrAction, pending_family_handler},
     {"AT+JVCHARG", kSetOrAction, pending_family_handler},
     {"AT+RMCHARGEP", kSetOrAction, pending_family_handler},
@@ -83,7 +85,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSFT", kSetOrAction, fast_search_test_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
-    {"AT+ZNGF", kSetOrAction, pending_family_handler},
+    {"AT+ZNGF", kSetOrAction, smart_speaker_Amplifier_calibrate_handler},
     {"AT+JVSYJM", kSetOrAction, pending_family_handler},
     {"AT+JVSSID", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVSEBOOT", kSetOrAction, jvseboot_handler},
@@ -102,7 +104,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
-    {"AT+JVAUDIO", kSetOrAction, pending_family_handler},
+    {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, pending_family_handler},
     {"AT+JVCONNWIFI", kSetOrAction, conn_wifi_handler},
@@ -113,7 +115,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSIMT", kSetOrAction, set_sim2_status_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
-    {"AT+EALT", kSetOrAction, pending_family_handler},
+    {"AT+EALT", kSetOrAction, mic_echo_handler},
     {"AT+EGMR", kSetOrAction, pending_family_handler},
     {"AT+EMBT", kSetOrAction, bt_handler},
     {"AT+JVWLAN", kSetOrAction, wifi_handler},
@@ -131,21 +133,21 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSG", kSetOrAction, pending_family_handler},
     {"AT+MMILED", kSetOrAction, pending_family_handler},
     {"AT+JVCOM", kSetOrAction, pending_family_handler},
-    {"AT+JVMT", kSetOrAction, pending_family_handler},
+    {"AT+JVMT", kSetOrAction, echo_handler},
     {"AT+JVTDNV", kSetOrAction, pending_family_handler},
     {"AT+JVLOGAT", kSetOrAction, pending_family_handler},
     {"AT+JVQHZS", kSetOrAction, pending_family_handler},
     {"AT+JVLIGHT", kSetOrAction, pending_family_handler},
     {"AT+JVQLOG", kSetOrAction, pending_family_handler},
-    {"AT+JVMTE", kSetOrAction, pending_family_handler},
-    {"AT+JVMTER", kSetOrAction, pending_family_handler},
-    {"AT+JVVMTEL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTS", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSR", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSL", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTSA", kSetOrAction, pending_family_handler},
-    {"AT+JVEMTRA", kSetOrAction, pending_family_handler},
+    {"AT+JVMTE", kSetOrAction, dual_mic_to_headset_handler},
+    {"AT+JVMTER", kSetOrAction, main_mic_to_headset_right_handler},
+    {"AT+JVVMTEL", kSetOrAction, sub_mic_to_headset_left_handler},
+    {"AT+JVEMTS", kSetOrAction, headset_to_speaker_handler},
+    {"AT+JVEMTR", kSetOrAction, headset_to_earpiece_handler},
+    {"AT+JVEMTSR", kSetOrAction, headset_to_right_speaker_handler},
+    {"AT+JVEMTSL", kSetOrAction, headset_to_left_speaker_handler},
+    {"AT+JVEMTSA", kSetOrAction, headset_to_speaker_with_gain_handler},
+    {"AT+JVEMTRA", kSetOrAction, headset_to_earpiece_with_gain_handler},
     {"AT+JVDISRECHARGE", kSetOrAction, pending_family_handler},
     {"AT+JVZFTX", kSetOrAction, primary_or_diversity_handler},
     {"AT+JVMEID", kSetOrAction, meid_code_handler},
@@ -156,7 +158,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVVSIM", kSetOrAction, virtual_sim_handler},
     {"AT+JVDPDT", kSetOrAction, set_dpdt_status_handler},
     {"AT+JVFILE", kSetOrAction, pending_family_handler},
-    {"AT+JVKTV", kSetOrAction, pending_family_handler},
+    {"AT+JVKTV", kSetOrAction, ktv_test_handler},
 };
 
 int pending_family_handler(char*, int, char*) { return RESULT_NOT_IMPLEMENTED; }

@@ -166,7 +166,8 @@ def prepare_mode(root, mode):
 
 
 def start_daemon(binary, root, port=None, log=None):
-    env = {k: v for k, v in os.environ.items() if not k.startswith("ATCID_")}
+    env = {k: v for k, v in os.environ.items()
+           if not k.startswith("ATCID_") or k == "ATCID_RESOLVER"}
     env["ATCID_ROOT"] = str(root)
     if port is not None:
         env["ATCID_PORT"] = str(port)

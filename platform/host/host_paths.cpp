@@ -5,10 +5,8 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
-#include <linux/openat2.h>
 #include <string>
 #include <string_view>
-#include <sys/syscall.h>
 #include <unistd.h>
 
 #include "platform/host/host_root.h"
@@ -78,23 +76,8 @@ int platform_init() {
   char real[4096];
   g_root_path = ::realpath(root, real) ? real : root;
   g_root = std::move(fd);
+  host_choose_resolver();
   return 0;
-}
-
-int host_resolve(const char* path, int flags, mode_t mode) {
-  if (path == nullptr || *path == '\0') {
-    errno = ENOENT;
-    return -1;
-  }
-  open_how how{};
-  how.flags = static_cast<unsigned>(flags | O_CLOEXEC);
-  how.mode = (flags & O_CREAT) ? mode : 0;
-  how.resolve = RESOLVE_IN_ROOT | RESOLVE_NO_MAGICLINKS;
-  for (;;) {
-    const long fd = ::syscall(SYS_openat2, g_root.get(), path, &how, sizeof how);
-    // RESOLVE_IN_ROOT asks for a retry when a rename raced the walk.
-    if (fd >= 0 || errno != EAGAIN) return static_cast<int>(fd);
-  }
 }
 
 int host_make_dirs(const char* path) {

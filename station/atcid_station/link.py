@@ -1,0 +1,186 @@
+"""The station's end of the port: a TCP connection or a serial device, read by a background
+thread into one buffer that the answer decoder and the unsolicited-line printer share."""
+
+import errno
+import socket
+import threading
+import time
+
+DEFAULT_TCP_PORT = 6888
+DEFAULT_BAUD = 115200
+
+
+class LinkError(Exception):
+    """The port could not be opened or was lost; the text says why for a person."""
+
+
+def parse_target(target):
+    """`tcp://HOST[:PORT]` → ("tcp", host, port); anything else is a serial device path."""
+    if target.startswith("tcp://"):
+        rest = target[len("tcp://"):].rstrip("/")
+        if not rest:
+            raise LinkError(f"{target}: no host")
+        host, port = rest, DEFAULT_TCP_PORT
+        if rest.startswith("["):  # [::1]:6888
+            close = rest.find("]")
+            if close < 0:
+                raise LinkError(f"{target}: unclosed '['")
+            host, tail = rest[1:close], rest[close + 1:]
+            if tail:
+                if not tail.startswith(":"):
+                    raise LinkError(f"{target}: bad port")
+                port = tail[1:]
+        elif rest.count(":") == 1:
+            host, port = rest.split(":")
+        try:
+            port = int(port)
+        except ValueError:
+            raise LinkError(f"{target}: bad port {port!r}") from None
+        if not 0 < port < 65536:
+            raise LinkError(f"{target}: port {port} out of range")
+        return "tcp", host, port
+    return "serial", target, None
+
+
+class Link:
+    """Bytes from the phone accumulate in `buffer` under `cond`; `closed` is set when the
+    port ended. `arrived` is the monotonic time of the last read."""
+
+    kind = None
+
+    def __init__(self):
+        self.buffer = bytearray()
+        self.cond = threading.Condition()
+        self.closed = False
+        self.arrived = time.monotonic()
+        self._reader = threading.Thread(target=self._read_loop, daemon=True)
+
+    def _start(self):
+        self._reader.start()
+
+    def _read_loop(self):
+        while True:
+            try:
+                data = self._read()
+            except (OSError, ValueError, TypeError):
+                data = b""
+            with self.cond:
+                if not data:
+                    self.closed = True
+                    self.cond.notify_all()
+                    return
+                self.buffer += data
+                self.arrived = time.monotonic()
+                self.cond.notify_all()
+
+    def take(self, count):
+        """Removes and returns the first `count` bytes of the buffer (caller holds `cond`)."""
+        data = bytes(self.buffer[:count])
+        del self.buffer[:count]
+        return data
+
+    def send(self, data):
+        try:
+            self._write(data)
+        except OSError as e:
+            raise LinkError(f"cannot send to the phone: {e.strerror or e}") from None
+
+    def close(self):
+        self._close()
+        if self._reader.is_alive() and self._reader is not threading.current_thread():
+            self._reader.join(timeout=2)
+
+
+class TcpLink(Link):
+    kind = "tcp"
+
+    def __init__(self, host, port, connect_timeout):
+        super().__init__()
+        self.name = f"tcp://{host}:{port}"
+        started = time.monotonic()
+        try:
+            self.sock = socket.create_connection((host, port), timeout=connect_timeout)
+        except socket.timeout:
+            raise LinkError(f"{self.name}: connection timed out after "
+                            f"{time.monotonic() - started:.1f} s") from None
+        except ConnectionRefusedError:
+            raise LinkError(f"{self.name}: connection refused (is the phone serving TCP?)") from None
+        except socket.gaierror as e:
+            raise LinkError(f"{self.name}: unknown host ({e.strerror})") from None
+        except OSError as e:
+            raise LinkError(f"{self.name}: {e.strerror or e}") from None
+        self.sock.settimeout(None)
+        self._start()
+
+    def _read(self):
+        return self.sock.recv(65536)
+
+    def _write(self, data):
+        self.sock.sendall(data)
+
+    def _close(self):
+        try:
+            self.sock.shutdown(socket.SHUT_RDWR)
+        except OSError:
+            pass
+        self.sock.close()
+
+
+class SerialLink(Link):
+    kind = "serial"
+
+    def __init__(self, device, baud):
+        super().__init__()
+        import serial  # pyserial, only needed for serial devices
+
+        self.name = device
+        try:
+            self.port = serial.Serial(device, baud, timeout=0.2, exclusive=True)
+        except serial.SerialException as e:
+            raise LinkError(f"{device}: {_serial_reason(e)}") from None
+        self._stop = False
+        self._start()
+
+    def _read(self):
+        while not self._stop:
+            waiting = self.port.in_waiting
+            data = self.port.read(waiting or 1)
+            if data:
+                return data
+        return b""
+
+    def _write(self, data):
+        self.port.write(data)
+        self.port.flush()
+
+    def _close(self):
+        self._stop = True
+        if self._reader.is_alive():
+            self._reader.join(timeout=2)
+        self.port.close()
+
+
+def _serial_reason(error):
+    code = getattr(error, "errno", None)
+    if code is None and error.args and isinstance(error.args[0], int):
+        code = error.args[0]
+    reasons = {
+        errno.ENOENT: "no such device",
+        errno.EBUSY: "device busy (another program has it open)",
+        errno.EAGAIN: "device busy (another program has it open)",
+        errno.EACCES: "permission denied",
+        errno.ENOTTY: "not a serial device",
+    }
+    if code in reasons:
+        return reasons[code]
+    text = str(error)
+    if "could not exclusively lock" in text:
+        return "device busy (another program has it open)"
+    return text
+
+
+def open_link(target, baud=DEFAULT_BAUD, connect_timeout=10.0):
+    kind, where, port = parse_target(target)
+    if kind == "tcp":
+        return TcpLink(where, port, connect_timeout)
+    return SerialLink(where, baud)
