@@ -59,7 +59,6 @@ std::vector<WlanCase> cases() {
   tx_off_unloaded.insert(tx_off_unloaded.begin(), load);
   return {
       {"tx_b", "AT+JVWLAN=2,2412.00,11.00,15.5", kLoaded, "", OK, "", tx("1", "11B_LONG_11_MBPS", "1550")},
-      {"tx_g_last_channel", "AT+JVWLAN=2,2484.00,54.00,10", kLoaded, "", OK, "", tx("14", "11A_54_MBPS", "1000")},
       {"tx_power_off_loads_driver", "AT+JVWLAN=2,2412.00,1.00,off", "", "wlan0     get_chpower:1500\n", OK, "", tx_off_unloaded},
       {"tx_power_off_no_value", "AT+JVWLAN=2,2412.00,1.00,OFF", kLoaded, "wlan0 get_chpower\n", ERR, "",
        {"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0", "iwpriv wlan0 ftm 1", "iwpriv wlan0 set_channel 1",
