@@ -10,7 +10,7 @@ from pathlib import Path
 import pytest
 
 import emulator
-from conftest import BINARY, TcpPhone, TtyPhone, framed_tty
+from conftest import BINARY, TcpPhone, framed_tty
 
 UNSHARE = shutil.which("unshare")
 MKSH = next((p for p in ("/bin/mksh-static", "/usr/bin/mksh-static") if os.path.exists(p)), None)
@@ -42,12 +42,9 @@ def root(device_root):
 
 
 @pytest.fixture
-def phone(root):
-    emulator.prepare_mode(root, "usb")
-    p = TtyPhone(root, "usb")
-    p.start()
-    yield p
-    p.stop()
+def phone(usb_phone):
+    phone_shell(usb_phone.root)  # the shell runs afresh for every command
+    return usb_phone
 
 
 def ok(line, body=b""):
