@@ -5,8 +5,11 @@
 #include "commands/audio_path.h"
 #include "commands/bluetooth.h"
 #include "commands/cellular.h"
+#include "commands/clock_language.h"
 #include "commands/device_info.h"
 #include "commands/gps_fm.h"
+#include "commands/identity.h"
+#include "commands/operator.h"
 #include "commands/storage.h"
 #include "commands/wlan.h"
 
@@ -17,7 +20,7 @@ constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
 constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCN", kSetOrAction, pending_family_handler},
     {"AT+ETST", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVSJ", kSetOrAction, pending_family_handler},
+    {"AT+JVSJ", kSetOrAction, get_system_time_handler},
     {"AT+JVMMIUI", kSetOrAction, pending_family_handler},
     {"AT+JVSP", kSetOrAction, pending_family_handler},
     {"AT+JVBS", kSetOrAction, pending_family_handler},
@@ -55,9 +58,9 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVHALL", kSetOrAction, jvhall_handler},
     {"AT+JVTESTMMI", kSetOrAction, pending_family_handler},
     {"AT+JV3G", kSetOrAction, pending_family_handler},
-    {"AT+JVOPTR", kSetOrAction, pending_family_handler},
+    {"AT+JVOPTR", kSetOrAction, optr_flag_handler},
     {"AT+JVUPDATE", kSetOrAction, pending_family_handler},
-    {"AT+JVOEM", kSetOrAction, pending_family_handler},
+    {"AT+JVOEM", kSetOrAction, check_oem_handler},
     {"AT+JVMODEL", kSetOrAction, jvmodel_handler},
     {"AT+JVLCD", kSetOrAction, pending_family_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
@@ -94,29 +97,29 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCARD", kSetOrAction, jvcard_handler},
     {"AT+JVGMQH", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+UPDATEAPPS", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLC", kSetOrAction, pending_family_handler},
+    {"AT+JVLC", kSetOrAction, set_language_handler},
     {"AT+JVRIC", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+SGDJZ", kSetOrAction, pending_family_handler},
     {"AT+JVCCM", kSetOrAction, jvccm_handler},
     {"AT+ONLINE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLANGUAGE", kSetOrAction, pending_family_handler},
+    {"AT+JVLANGUAGE", kSetOrAction, set_default_language_handler},
     {"AT+JVFLIGHT", kSetOrAction, pending_family_handler},
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
-    {"AT+PEMUKP", kSetOrAction, pending_family_handler},
+    {"AT+PEMUKP", kSetOrAction, RSA_key_handler},
     {"AT+JVCONNWIFI", kSetOrAction, conn_wifi_handler},
     {"AT+JVDW", kSetOrAction, locate_access_on_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVPROP", kSetOrAction, pending_family_handler},
+    {"AT+JVPROP", kSetOrAction, property_set_handler},
     {"AT+JVSIMT", kSetOrAction, set_sim2_status_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
     {"AT+EALT", kSetOrAction, mic_echo_handler},
-    {"AT+EGMR", kSetOrAction, pending_family_handler},
+    {"AT+EGMR", kSetOrAction, imei_and_pcb_code_on_handler},
     {"AT+EMBT", kSetOrAction, bt_handler},
     {"AT+JVWLAN", kSetOrAction, wifi_handler},
     {"AT+JVGPS", kSetOrAction, gps_handler},
@@ -134,7 +137,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+MMILED", kSetOrAction, pending_family_handler},
     {"AT+JVCOM", kSetOrAction, pending_family_handler},
     {"AT+JVMT", kSetOrAction, echo_handler},
-    {"AT+JVTDNV", kSetOrAction, pending_family_handler},
+    {"AT+JVTDNV", kSetOrAction, nv_66024_handler},
     {"AT+JVLOGAT", kSetOrAction, pending_family_handler},
     {"AT+JVQHZS", kSetOrAction, pending_family_handler},
     {"AT+JVLIGHT", kSetOrAction, pending_family_handler},
@@ -153,7 +156,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVMEID", kSetOrAction, meid_code_handler},
     {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, pending_family_handler},
-    {"AT+JVSYS", kSetOrAction, pending_family_handler},
+    {"AT+JVSYS", kSetOrAction, change_sig_system_handler},
     {"AT+JVEFS", kSetOrAction, pending_family_handler},
     {"AT+JVVSIM", kSetOrAction, virtual_sim_handler},
     {"AT+JVDPDT", kSetOrAction, set_dpdt_status_handler},

@@ -1,6 +1,5 @@
 """Radio test commands through the real daemon on a launcher-made root, and the stand-in tools
 they run, answers compared byte for byte."""
-import os
 import shutil
 import subprocess
 import threading
@@ -13,18 +12,6 @@ import emulator
 from conftest import BINARY, TcpPhone, framed_tty
 
 UNSHARE = shutil.which("unshare")
-MKSH = next((p for p in ("/bin/mksh-static", "/usr/bin/mksh-static") if os.path.exists(p)), None)
-
-
-def phone_shell(root):
-    """The phone's shell finds every tool through PATH, so the stand-ins run instead of a
-    multi-call binary's applets."""
-    if MKSH is None:
-        pytest.skip("no static mksh on this machine")
-    sh = Path(root) / "system/bin/sh"
-    if sh.is_symlink() or sh.exists():
-        sh.unlink()
-    shutil.copy2(MKSH, sh)
 
 
 def in_phone(root, command):
@@ -37,13 +24,11 @@ def in_phone(root, command):
 
 @pytest.fixture
 def root(device_root):
-    phone_shell(device_root)
     return device_root
 
 
 @pytest.fixture
 def phone(usb_phone):
-    phone_shell(usb_phone.root)  # the shell runs afresh for every command
     return usb_phone
 
 
@@ -60,7 +45,6 @@ def error(line):
 class SlowCommand:
     def __init__(self, root, line, setup=None):
         emulator.prepare_mode(root, "tcp")
-        phone_shell(root)
         if setup:
             setup(Path(root))
         self.phone = TcpPhone(root)
