@@ -4,11 +4,14 @@
 #include "commands/amplifier.h"
 #include "commands/audio_path.h"
 #include "commands/battery.h"
+#include "commands/bluetooth.h"
+#include "commands/cellular.h"
 #include "commands/clock_language.h"
 #include "commands/device_info.h"
 #include "commands/display.h"
 #include "commands/factory_flags.h"
 #include "commands/file_transfer.h"
+#include "commands/gps_fm.h"
 #include "commands/identity.h"
 #include "commands/lights.h"
 #include "commands/operator.h"
@@ -16,6 +19,7 @@
 #include "commands/sensors.h"
 #include "commands/storage.h"
 #include "commands/usb_adb.h"
+#include "commands/wlan.h"
 
 namespace {
 constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
@@ -29,7 +33,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVSP", kSetOrAction, jvsp_handler},
     {"AT+JVBS", kSetOrAction, jvbs_handler},
     {"AT+LCMT", kSetOrAction, lcmt_handler},
-    {"AT+OFFL", kSetOrAction, pending_family_handler},
+    {"AT+OFFL", kSetOrAction, plan_mode_test_handler},
     {"AT+EQSB", kSetOrAction, eqsb_handler},
     {"AT+TFST", kSetOrAction, tfst_handler},
     {"AT+JVROOT", kSetOrAction, jvroot_handler},
@@ -69,27 +73,27 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVLCD", kSetOrAction, jvlcd_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVG3G", kSetOrAction, jvg3g_handler},
-    {"AT+JVSB3G", kSetOrAction, pending_family_handler},
-    {"AT+JVSBDT", kSetOrAction, pending_family_handler},
+    {"AT+JVSB3G", kSetOrAction, status_bar_3g_handler},
+    {"AT+JVSBDT", kSetOrAction, status_bar_data_handler},
     {"AT+JVSDCALI", kSetOrAction, jvsdcali_handler},
     {"AT+JVUSB", kSetOrAction, jvusb_handler},
     {"AT+JVSJZLB", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVQXGWBH", kSetOrAction, jvqxgwbh_handler},
-    {"AT+JVNFC", kSetOrAction, pending_family_handler},
+    {"AT+JVNFC", kSetOrAction, nfc_tag_handler},
     {"AT+JVRID", kSetOrAction, jvrid_handler},
-    {"AT+JVSWXFK", kSetOrAction, pending_family_handler},
+    {"AT+JVSWXFK", kSetOrAction, fast_search_net_handler},
     {"AT+JVLCMID", kSetOrAction, jvlcmid_handler},
     {"AT+JVCCMID", kSetOrAction, jvccmid_handler},
     {"AT+JVPID", kSetOrAction, jvpid_handler},
     {"AT+JVRAM", kSetOrAction, jvram_handler},
-    {"AT+JVRADIO", kSetOrAction, pending_family_handler},
+    {"AT+JVRADIO", kSetOrAction, radio_type_handler},
     {"AT+JVCKIC", kSetOrAction, jvckic_handler},
     {"AT+JVBBTYPE", kSetOrAction, jvbbtype_handler},
     {"AT+JVRTALL", kSetOrAction, jvrtall_handler},
     {"AT+JVLOG", kSetOrAction, jvlog_handler},
     {"AT+MMICCM", kSetOrAction, mmiccm_handler},
     {"AT+MMITW", kSetOrAction, mmitw_handler},
-    {"AT+JVSFT", kSetOrAction, pending_family_handler},
+    {"AT+JVSFT", kSetOrAction, fast_search_test_handler},
     {"AT+JVDF", kSetOrAction, jvdf_handler},
     {"AT+JVFN", kSetOrAction, jvfn_handler},
     {"AT+ZNGF", kSetOrAction, smart_speaker_Amplifier_calibrate_handler},
@@ -114,26 +118,26 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
     {"AT+PEMUKP", kSetOrAction, RSA_key_handler},
-    {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
-    {"AT+JVDW", kSetOrAction, pending_family_handler},
+    {"AT+JVCONNWIFI", kSetOrAction, conn_wifi_handler},
+    {"AT+JVDW", kSetOrAction, locate_access_on_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVPROP", kSetOrAction, property_set_handler},
-    {"AT+JVSIMT", kSetOrAction, pending_family_handler},
+    {"AT+JVSIMT", kSetOrAction, set_sim2_status_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, eadc_handler},
     {"AT+EALT", kSetOrAction, mic_echo_handler},
     {"AT+EGMR", kSetOrAction, imei_and_pcb_code_on_handler},
-    {"AT+EMBT", kSetOrAction, pending_family_handler},
-    {"AT+JVWLAN", kSetOrAction, pending_family_handler},
-    {"AT+JVGPS", kSetOrAction, pending_family_handler},
-    {"AT+JVWMAC", kSetOrAction, pending_family_handler},
+    {"AT+EMBT", kSetOrAction, bt_handler},
+    {"AT+JVWLAN", kSetOrAction, wifi_handler},
+    {"AT+JVGPS", kSetOrAction, gps_handler},
+    {"AT+JVWMAC", kSetOrAction, wlan_addr_handler},
     {"AT+JVZLJC", kSetOrAction, jvzljc_handler},
     {"AT+JVDZLP", kSetOrAction, jvdzlp_handler},
     {"AT+JVHWKJ", kSetOrAction, jvhwkj_handler},
     {"AT+JVGM", kSetOrAction, jvgm_handler},
     {"AT+JVTLY", kSetOrAction, jvtly_handler},
-    {"AT+JVFM", kSetOrAction, pending_family_handler},
+    {"AT+JVFM", kSetOrAction, fm_test_handler},
     {"AT+JVGJ", kSetOrAction, jvgj_handler},
     {"AT+JVREBOOT", kSetOrAction, jvreboot_handler},
     {"AT+JVRT", kSetOrAction, jvrt_handler},
@@ -156,14 +160,14 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVEMTSA", kSetOrAction, headset_to_speaker_with_gain_handler},
     {"AT+JVEMTRA", kSetOrAction, headset_to_earpiece_with_gain_handler},
     {"AT+JVDISRECHARGE", kSetOrAction, jvdisrecharge_handler},
-    {"AT+JVZFTX", kSetOrAction, pending_family_handler},
-    {"AT+JVMEID", kSetOrAction, pending_family_handler},
+    {"AT+JVZFTX", kSetOrAction, primary_or_diversity_handler},
+    {"AT+JVMEID", kSetOrAction, meid_code_handler},
     {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, jvdljcs_handler},
     {"AT+JVSYS", kSetOrAction, change_sig_system_handler},
     {"AT+JVEFS", kSetOrAction, jvefs_handler},
-    {"AT+JVVSIM", kSetOrAction, pending_family_handler},
-    {"AT+JVDPDT", kSetOrAction, pending_family_handler},
+    {"AT+JVVSIM", kSetOrAction, virtual_sim_handler},
+    {"AT+JVDPDT", kSetOrAction, set_dpdt_status_handler},
     {"AT+JVFILE", kSetOrAction, jvfile_handler},
     {"AT+JVKTV", kSetOrAction, ktv_test_handler},
 };

@@ -66,3 +66,7 @@ int release_wake_lock(const char* name);
 // The frame buffer's blank request (FBIOBLANK) on an open frame-buffer descriptor: 0, or -1.
 inline constexpr int FB_BLANK_POWERDOWN = 4;
 int platform_fb_blank(int fd, int mode);
+
+// The FM tuner's signal strength: VIDIOC_G_TUNER for tuner 0 on the open radio device. 0 with
+// `signal` set; -1 when the tuner cannot be read (`signal` untouched).
+int platform_fm_tuner_signal(int fd, int* signal);

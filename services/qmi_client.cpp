@@ -15,6 +15,8 @@ int32_t qmi_flag = 0;
 char return_buffer[1024];
 int32_t oem_buf[32];
 std::atomic<int32_t> qmi_pending{0};
+// Both the GPS poll thread and handlers send fixed messages; they share the globals.
+std::recursive_mutex qmi_request_lock;
 
 static_assert(sizeof return_buffer == 1024 && sizeof oem_buf == 128);
 
@@ -60,9 +62,6 @@ static_assert(kMaxResponse == sizeof(kro_gps_option_resp_msg_v01));
 // The answer of the fixed-message requests is only ever kept in the globals.
 void* const kFixedCallbackData = reinterpret_cast<void*>(uintptr_t{2});
 
-// Both the GPS poll thread and handlers send fixed messages; they share the globals.
-std::mutex g_fixed_lock;
-
 constexpr unsigned kMaxServiceEntries = 8;
 
 unsigned as_hex(const void* p) { return static_cast<unsigned>(reinterpret_cast<uintptr_t>(p)); }
@@ -76,7 +75,7 @@ int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* t
   const QmiMessageSizes sizes = qmi_kro_sizes_of(m.id);
   alignas(8) unsigned char resp[kMaxResponse] = {};
 
-  std::lock_guard<std::mutex> one_at_a_time(g_fixed_lock);
+  std::lock_guard<std::recursive_mutex> one_at_a_time(qmi_request_lock);
   if (qmi_kro_clnt_init(clnt) != 0) {
     QMI_LOG(LOG_LVL_ERR, m.name, "qmi_kro_clnt_init() fail");
     return -1;

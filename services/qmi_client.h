@@ -7,6 +7,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <mutex>
 
 #include "platform/qmi_transport.h"
 #include "services/qmi_messages.h"
@@ -16,6 +17,11 @@ extern int32_t qmi_flag;                  // its transport error
 extern char return_buffer[1024];          // its text, cleared by every response
 extern int32_t oem_buf[32];               // OEM block of the last NV read that carried one
 extern std::atomic<int32_t> qmi_pending;  // requests sent and not yet answered
+
+// One fixed-message request at a time. A caller that reads the results above holds it across
+// its request and the reading, so no other thread's request (the GPS poll) lands in between;
+// the requests take it again themselves.
+extern std::recursive_mutex qmi_request_lock;
 
 // The semaphore variants' wait record.
 struct qmi_kro_wait_record {

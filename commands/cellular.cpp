@@ -1,0 +1,458 @@
+#include "commands/cellular.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+#include <mutex>
+#include <string_view>
+#include <strings.h>
+
+#include "commands/command_util.h"
+#include "commands/radio_util.h"
+#include "core/command.h"
+#include "core/log.h"
+#include "core/serial.h"
+#include "platform/platform.h"
+#include "platform/unique_fd.h"
+#include "services/factory_support.h"
+#include "services/qmi_client.h"
+
+namespace {
+
+constexpr const char* kFastSearchNet = "com.android.phone.fastSearchNet.FastSearchNetService";
+constexpr const char* kConnWifiReceiver = "com.ulda.engineermode/.ConnWifiReceiver";
+constexpr const char* kKeepScreenOn = "kro.intent.action.KEEP_CREEN_ON";
+
+void log_cmdline(const char* caller, const char* cmdline) {
+  atci_log(LOG_LVL_DEBUG, __LINE__, caller, "===========cmdline %s\r\n", cmdline);
+}
+
+// A field as a writable, terminated copy of at most N - 1 characters.
+template <size_t N>
+void copy_field(char (&out)[N], std::string_view field) {
+  const size_t n = field.size() < N - 1 ? field.size() : N - 1;
+  std::memcpy(out, field.data(), n);
+  out[n] = '\0';
+}
+
+// A broadcast switch of two whole-line variants: "=1" sends `on`, "=0" sends `off`.
+struct Switch {
+  const char* on_line;
+  const char* off_line;
+  const char* action;
+  const char* on_extras;
+  const char* off_extras;
+};
+
+int broadcast_switch(const Switch& s, const char* cmdline) {
+  const char* extras = line_is(cmdline, s.on_line)    ? s.on_extras
+                       : line_is(cmdline, s.off_line) ? s.off_extras
+                                                      : nullptr;
+  if (extras == nullptr) {
+    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
+    return RESULT_ERROR;
+  }
+  sendBroadcastFromAtcid(nullptr, s.action, extras);
+  return RESULT_OK;
+}
+
+using IntRequest = int (*)(qmi::client_type*, qmi::txn_handle*, const kro_int_req_msg_v01*);
+
+// One 4-byte request and the reading of its results as one step. True when the request
+// returned 0 and its answer came without a transport error; `text` gets the answer text.
+bool int_request(IntRequest request, int32_t value, char (&text)[sizeof return_buffer]) {
+  std::lock_guard<std::recursive_mutex> step(qmi_request_lock);
+  const kro_int_req_msg_v01 req{value};
+  const int rc = request(nullptr, nullptr, &req);
+  std::memcpy(text, return_buffer, sizeof text);
+  text[sizeof text - 1] = '\0';
+  return rc == 0 && qmi_flag == 0;
+}
+
+constexpr std::string_view kPresentSimStates[] = {
+    "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
+    "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
+};
+
+bool sim2_present() {
+  char states[PROPERTY_VALUE_MAX];
+  property_get("gsm.sim.state", states, " ");
+  std::string_view sim2(states);
+  if (sim2.find(',') != std::string_view::npos) {
+    next_token(sim2, ",");
+    sim2 = next_token(sim2, ",");
+  } else {
+    property_get("gsm.sim.state.2", states, " ");
+    sim2 = states;
+  }
+  for (std::string_view present : kPresentSimStates)
+    if (sim2 == present) return true;
+  return false;
+}
+
+// Modem NV items behind the MEID and WLAN MAC commands.
+struct NvCommand {
+  const char* read_line;
+  const char* write_prefix;
+  uint32_t item;
+  uint8_t read_option;
+};
+constexpr NvCommand kMeid{"AT+JVMEID=0", "AT+JVMEID=1", 1943, 0};
+constexpr NvCommand kWlanMac{"AT+JVWMAC=0", "AT+JVWMAC=1", 4678, 1};
+
+int nv_read(const NvCommand& nv, char* response) {
+  kro_read_nv_info_req_msg_v01 req{};
+  req.nvItem_id = nv.item;
+  req.option[0] = req.option[1] = nv.read_option;
+  kro_read_nv_info_resp_msg_v01 resp{};
+  qmi_kro_wait_record wait{};
+  wait.transp_err = -1;
+  const int rc = qmi_kro_read_nv_msg_ex(&req, sizeof req, QMI_KRO_READ_NV_INFO_RESP_MSG_V01, &resp,
+                                        sizeof resp, &wait);
+  if (rc != 0 || wait.msg_id != QMI_KRO_READ_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0) {
+    ATCI_LOGE("ret=%d, msg_id=%d, status=%d", rc, wait.msg_id, wait.transp_err);
+    return RESULT_ERROR;
+  }
+  if (resp.buffer_valid != 1) {
+    ATCI_LOGE("get_nv_rsp.buffer_valid:%d", resp.buffer_valid);
+    return RESULT_ERROR;
+  }
+  std::snprintf(response, RESPONSE_SIZE, "%.*s", static_cast<int>(sizeof resp.buffer),
+                resp.buffer);
+  return RESULT_OK;
+}
+
+int nv_write(const NvCommand& nv, const char* cmdline) {
+  CommaFields fields(cmdline);
+  const std::string_view field = fields.next();
+  if (field.empty()) {
+    ATCI_LOGE("========The wlan addr is NULL====");
+    return RESULT_ERROR;
+  }
+  char value[CMD_LINE_SIZE];
+  copy_field(value, field);
+  substring(value);
+  kro_write_nv_info_req_msg_v01 req{};
+  req.nvItem_id = nv.item;
+  req.buffer_valid = 1;
+  std::snprintf(req.buffer, sizeof req.buffer, "%.255s", value);
+  qmi_response_type_v01 resp{-1, -1};
+  qmi_kro_wait_record wait{};
+  wait.transp_err = -1;
+  const int rc = qmi_kro_write_nv_msg_ex(&req, sizeof req, QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01,
+                                         &resp, sizeof resp, &wait);
+  // A write the modem refused is no success, whatever the transport says.
+  if (rc != 0 || wait.msg_id != QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0 ||
+      resp.result != 0) {
+    ATCI_LOGE("ret=%d, msg_id=%d, status=%d\n", rc, wait.msg_id, wait.transp_err);
+    ATCI_LOGE("error=%d, result=%d\n", resp.error, resp.result);
+    return RESULT_ERROR;
+  }
+  return RESULT_OK;
+}
+
+int nv_command(const NvCommand& nv, const char* caller, const char* cmdline, char* response) {
+  log_cmdline(caller, cmdline);
+  if (line_is(cmdline, nv.read_line)) return nv_read(nv, response);
+  if (line_starts_with(cmdline, nv.write_prefix)) return nv_write(nv, cmdline);
+  return REJECT_COMMAND_LINE(cmdline);
+}
+
+}  // namespace
+
+int plan_mode_test_handler(char* cmdline, int, char*) {
+  log_cmdline(__func__, cmdline);
+  if (line_is(cmdline, "AT+OFFL=1")) {
+    char mode[PROPERTY_VALUE_MAX];
+    property_get("persist.sys.kroem", mode, " ");
+    if (std::strcmp(mode, "2") == 0) {
+      if (is_uart_flag == 0)
+        sendBroadcastFromAtcid(nullptr, "android.intent.action.RESTART_ATCID", "--ei em 1");
+      ATCI_LOGI("send broadcast android.intent.action.RESTART_ATCID\r\n");
+    }
+    if (is_uart_flag == 0)
+      sendBroadcastFromAtcid(nullptr, "android.intent.action.AT_AIRPLANE_MODE", "--ez state true");
+    return RESULT_OK;
+  }
+  if (line_is(cmdline, "AT+OFFL=0")) {
+    if (is_uart_flag == 0)
+      sendBroadcastFromAtcid(nullptr, "android.intent.action.AT_AIRPLANE_MODE", "--ez state false");
+    return RESULT_OK;
+  }
+  ATCI_LOGE("====this at command invalid:%s====\r\n", cmdline);
+  return RESULT_ERROR;
+}
+
+int status_bar_3g_handler(char* cmdline, int, char*) {
+  log_cmdline(__func__, cmdline);
+  static constexpr Switch k3g{"AT+JVSB3G=1", "AT+JVSB3G=0", "android.intent.action.AT_3G_STATUS",
+                              "--ez state true", "--ez state false"};
+  return broadcast_switch(k3g, cmdline);
+}
+
+int status_bar_data_handler(char* cmdline, int, char*) {
+  log_cmdline(__func__, cmdline);
+  static constexpr Switch kData{"AT+JVSBDT=1", "AT+JVSBDT=0",
+                                "android.intent.action.AT_DATA_ENABLE", "--ez state true",
+                                "--ez state false"};
+  return broadcast_switch(kData, cmdline);
+}
+
+int fast_search_net_handler(char* cmdline, int, char*) {
+  log_cmdline(__func__, cmdline);
+  if (line_is(cmdline, "AT+JVSWXFK=1"))
+    ATCI_LOGI("===send fastSearchNet float open begin==== \r\n");
+  static constexpr Switch kFloat{"AT+JVSWXFK=1", "AT+JVSWXFK=0", kFastSearchNet,
+                                 "--es command open", "--es command close"};
+  return broadcast_switch(kFloat, cmdline);
+}
+
+int fast_search_test_handler(char* cmdline, int, char*) {
+  log_cmdline(__func__, cmdline);
+  if (line_starts_with(cmdline, "AT+JVSFT=1")) {
+    CommaFields fields(cmdline);
+    const std::string_view sim = fields.next();
+    const std::string_view act = fields.next();
+    const std::string_view channel = fields.next();
+    if (sim.empty() || act.empty() || channel.empty()) {
+      ATCI_LOGE("===========sim OR act OR channel is NULL\r\n");
+      return RESULT_ERROR;
+    }
+    char extras[256];
+    std::snprintf(extras, sizeof extras, "--es status 1 --es sim %.*s --es act %.*s --es arfcn %.*s",
+                  static_cast<int>(sim.size()), sim.data(), static_cast<int>(act.size()),
+                  act.data(), static_cast<int>(channel.size()), channel.data());
+    sendBroadcastFromAtcid(nullptr, kFastSearchNet, extras);
+    return RESULT_OK;
+  }
+  if (line_starts_with(cmdline, "AT+JVSFT=0")) {
+    sendBroadcastFromAtcid(nullptr, kFastSearchNet, "--es status 0");
+    return RESULT_OK;
+  }
+  ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
+  return RESULT_ERROR;
+}
+
+int radio_type_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  if (!line_is(cmdline, "AT+JVRADIO=0")) {
+    ATCI_LOGE("=======this at command invalid:%s*\r\n", cmdline);
+    return RESULT_ERROR;
+  }
+  struct RadioType {
+    const char* abbr;
+    const char* bands;
+  };
+  static constexpr RadioType kTypes[] = {
+      {"T", "TD+GSM"},
+      {"W", "WCDMA+GSM"},
+      {"E", "EVD0+GSM"},
+      {"A", "TDD-LTE+FDD-LTE+WCDMA+TD+GSM"},
+      {"D", "TDD-LTE+FDD-LTE+WCDMA+TD+GSM"},
+      {"L", "TDD-LTE+TD+GSM"},
+      {"M", "TDD-LTE+TD+WCDMA+GSM"},
+      {"F", "FDD-LTE+WCDMA+GSM"},
+      {"H", "FDD-LTE+TDD-LTE+WCDMA+GSM"},
+      {"V", "FDD-LTE+EVDO+GSM"},
+      {"U", "FDD-LTE+WCDMA+EVDO+GSM"},
+  };
+  char abbr[PROPERTY_VALUE_MAX];
+  property_get("persist.pemu.radio.type.abbr", abbr, "");
+  for (const RadioType& type : kTypes)
+    if (strcasecmp(abbr, type.abbr) == 0) return answer_quoted(response, type.bands);
+  return RESULT_OK;
+}
+
+int set_sim2_status_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  struct Sim2Switch {
+    const char* line;
+    const char* command;
+    const char* failure;
+    int32_t value;
+  };
+  static constexpr Sim2Switch kSwitches[] = {
+      {"AT+JVSIMT=0", "/system/bin/sh -c \"touch /data/sim2_status\"",
+       "Touch /data/sim2_status fail!\r\n", 0},
+      {"AT+JVSIMT=1", "/system/bin/sh -c \"rm /data/sim2_status \"",
+       "rm /data/sim2_status fail!\r\n", 1},
+  };
+  for (const Sim2Switch& s : kSwitches) {
+    if (!line_is(cmdline, s.line)) continue;
+    if (run_shell(s.command) < 0) {
+      ATCI_LOGE("%s", s.failure);
+      return RESULT_ERROR;
+    }
+    char ignored[sizeof return_buffer];
+    int_request(qmi_switch_sim2_status, s.value, ignored);
+    return RESULT_OK;
+  }
+  if (line_is(cmdline, "AT+JVSIMT=2")) return answer_quoted_int(response, sim2_present() ? 1 : 0);
+  return REJECT_COMMAND_LINE(cmdline);
+}
+
+int primary_or_diversity_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  char text[sizeof return_buffer];
+  if (line_starts_with(cmdline, "AT+JVZFTX=1")) {
+    CommaFields fields(cmdline);
+    const std::string_view n = fields.next();
+    if (n.empty()) return RESULT_ERROR;
+    return result_of(int_request(mutuallySwitchForPrimaryAndDiversity,
+                                 static_cast<int32_t>(parse_long(n)), text));
+  }
+  if (line_is(cmdline, "AT+JVZFTX=0")) {
+    if (!int_request(getPrimaryAndDiversitymsg, 1, text)) return RESULT_ERROR;
+    std::snprintf(response, RESPONSE_SIZE, "%s", text);
+    return RESULT_OK;
+  }
+  return REJECT_COMMAND_LINE(cmdline);
+}
+
+int meid_code_handler(char* cmdline, int, char* response) {
+  return nv_command(kMeid, __func__, cmdline, response);
+}
+
+int wlan_addr_handler(char* cmdline, int, char* response) {
+  return nv_command(kWlanMac, __func__, cmdline, response);
+}
+
+int virtual_sim_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  struct VirtualSim {
+    const char* line;
+    const char* activity;
+    int32_t code;
+  };
+  static constexpr VirtualSim kVariants[] = {
+      {"AT+JVVSIM=1", "com.pemu.networkstate/.VirtualSIMActivity", 11},
+      {"AT+JVVSIM=2", "com.pemu.networkstate/.VirtualSIM8960Activity", 12},
+      {"AT+JVVSIM=3", nullptr, 13},
+      {"AT+JVVSIM=4", nullptr, 14},
+      {"AT+JVVSIM=5", nullptr, 15},
+  };
+  const VirtualSim* v = nullptr;
+  for (const VirtualSim& candidate : kVariants)
+    if (line_is(cmdline, candidate.line)) v = &candidate;
+  if (v == nullptr) return RESULT_ERROR;
+
+  if (v->activity != nullptr) startActivityFromAtcid(v->activity, nullptr, nullptr);
+  if (v->code == 14) {
+    property_set("persist.radio.multisim.config", "");
+    property_set("persist.sys.tel.autoanswer.ms", "5");
+  }
+  char text[sizeof return_buffer];
+  if (!int_request(qmi_set_status, v->code, text)) {
+    ATCI_LOGE("======send qmi msg fail\n");
+    return RESULT_ERROR;
+  }
+  if (v->code == 14) {
+    dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db");
+    dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db-journal");
+  }
+  if (v->code == 15) std::snprintf(response, RESPONSE_SIZE, "\r\n%s\r\n", text);
+  return RESULT_OK;
+}
+
+int set_dpdt_status_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  enum class Answer { kConfirm, kNormal, kCross, kBits, kText };
+  struct Dpdt {
+    const char* line;
+    int32_t code;
+    Answer answer;
+  };
+  static constexpr Dpdt kVariants[] = {
+      {"AT+JVDPDT=0", 110, Answer::kConfirm}, {"AT+JVDPDT=1", 111, Answer::kConfirm},
+      {"AT+JVDPDT=2", 112, Answer::kNormal},  {"AT+JVDPDT=3", 113, Answer::kCross},
+      {"AT+JVDPDT=4", 118, Answer::kBits},    {"AT+JVDPDT=6", 116, Answer::kConfirm},
+      {"AT+JVDPDT=7", 117, Answer::kConfirm}, {"AT+JVDPDT=8", 118, Answer::kText},
+  };
+  if (line_is(cmdline, "AT+JVDPDT=5")) {
+    startServiceFromAtcid("com.ulda.engineermode/.SwitchPdptStatusService", nullptr, nullptr);
+    return RESULT_OK;
+  }
+  for (const Dpdt& v : kVariants) {
+    if (!line_is(cmdline, v.line)) continue;
+    char text[sizeof return_buffer];
+    const bool answered = int_request(qmi_set_status, v.code, text);
+    ATCI_LOGD("return_buffer: %s\r\n", text);
+    if (!answered) return RESULT_ERROR;
+    switch (v.answer) {
+      case Answer::kBits: {
+        const long bits = parse_long(text);
+        std::snprintf(response, RESPONSE_SIZE, "\r\n\"%ld,%ld\"\r\n", bits & 3, (bits >> 2) & 3);
+        return RESULT_OK;
+      }
+      case Answer::kText:
+        std::snprintf(response, RESPONSE_SIZE, "\r\n%s\r\n", text);
+        return RESULT_OK;
+      default:
+        break;
+    }
+    if (std::strcmp(text, "0") != 0) return RESULT_ERROR;
+    if (v.answer == Answer::kNormal) property_set("persist.sys.dpdt", "normal");
+    if (v.answer == Answer::kCross) property_set("persist.sys.dpdt", "cross");
+    return RESULT_OK;
+  }
+  return REJECT_COMMAND_LINE(cmdline);
+}
+
+int nfc_tag_handler(char* cmdline, int, char* response) {
+  log_cmdline(__func__, cmdline);
+  if (!line_is(cmdline, "AT+JVNFC=2")) return RESULT_ERROR;
+  constexpr const char* kTagId = "/data/data/com.android.nfc/files/TagId";
+  UniqueFd fd(dev_open(kTagId, O_RDONLY | O_CLOEXEC));
+  if (!fd.ok()) {
+    ATCI_LOGE("==open %s fail\r\n", kTagId);
+    return RESULT_ERROR;
+  }
+  unsigned char tag[20];
+  const ssize_t n = ::read(fd.get(), tag, sizeof tag);
+  ATCI_LOGD("==read %s:%d\r\n", kTagId, static_cast<int>(n));
+  if (n <= 3) return RESULT_ERROR;
+  char hex[2 * sizeof tag + 1] = {};
+  for (ssize_t i = 0; i < n; ++i) std::snprintf(hex + 2 * i, 3, "%02x", tag[i]);
+  return answer_quoted(response, hex);
+}
+
+int conn_wifi_handler(char* cmdline, int, char*) {
+  atci_log(LOG_LVL_DEBUG, __LINE__, __func__, "======cmdline %s======\r\n", cmdline);
+  if (line_is(cmdline, "AT+JVCONNWIFI=0")) {
+    sendBroadcastFromAtcid(kConnWifiReceiver, "kro.intent.action.DISCONNWIFI", nullptr);
+    return RESULT_OK;
+  }
+  constexpr std::string_view kName = "AT+JVCONNWIFI";
+  const std::string_view line(cmdline);
+  if (!line_starts_with(cmdline, "AT+JVCONNWIFI") ||
+      (line.size() > kName.size() && line[kName.size()] != '=')) {
+    ATCI_LOGE("==command invalid:%s", cmdline);
+    return RESULT_ERROR;
+  }
+  std::string_view rest = line.substr(std::min(line.find('='), line.size()));
+  if (!rest.empty()) rest.remove_prefix(1);
+  const std::string_view ssid_field = next_token(rest, ",");
+  const std::string_view pwd_field = next_token(rest, ",");
+  if (ssid_field.empty()) {
+    ATCI_LOGE("==command invalid:%s", cmdline);
+    return RESULT_ERROR;
+  }
+  char ssid[CMD_LINE_SIZE];
+  char pwd[CMD_LINE_SIZE];
+  copy_field(ssid, ssid_field);
+  copy_field(pwd, pwd_field.empty() ? std::string_view("(null)") : pwd_field);
+  substring(ssid);
+  if (!pwd_field.empty()) substring(pwd);
+  char extras[2 * CMD_LINE_SIZE + 32];
+  std::snprintf(extras, sizeof extras, "-e ssid %s -e pwd %s", ssid, pwd);
+  sendBroadcastFromAtcid(kConnWifiReceiver, "kro.intent.action.CONNWIFI", extras);
+  sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 3");
+  ::sleep(50);
+  sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 4");
+  platform_sync();
+  ::usleep(150 * 1000);
+  platform_restart();
+}
