@@ -3,7 +3,10 @@
 
 #include "commands/amplifier.h"
 #include "commands/audio_path.h"
+#include "commands/clock_language.h"
 #include "commands/device_info.h"
+#include "commands/identity.h"
+#include "commands/operator.h"
 #include "commands/storage.h"
 
 namespace {
@@ -13,7 +16,7 @@ constexpr int32_t kSetOrAction = OP_SET | OP_ACTION;
 constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCN", kSetOrAction, pending_family_handler},
     {"AT+ETST", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVSJ", kSetOrAction, pending_family_handler},
+    {"AT+JVSJ", kSetOrAction, get_system_time_handler},
     {"AT+JVMMIUI", kSetOrAction, pending_family_handler},
     {"AT+JVSP", kSetOrAction, pending_family_handler},
     {"AT+JVBS", kSetOrAction, pending_family_handler},
@@ -51,9 +54,9 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVHALL", kSetOrAction, jvhall_handler},
     {"AT+JVTESTMMI", kSetOrAction, pending_family_handler},
     {"AT+JV3G", kSetOrAction, pending_family_handler},
-    {"AT+JVOPTR", kSetOrAction, pending_family_handler},
+    {"AT+JVOPTR", kSetOrAction, optr_flag_handler},
     {"AT+JVUPDATE", kSetOrAction, pending_family_handler},
-    {"AT+JVOEM", kSetOrAction, pending_family_handler},
+    {"AT+JVOEM", kSetOrAction, check_oem_handler},
     {"AT+JVMODEL", kSetOrAction, jvmodel_handler},
     {"AT+JVLCD", kSetOrAction, pending_family_handler},
     {"AT+JVAPP", kSetOrAction, unspecified_command_handler},  // not specified further
@@ -90,29 +93,29 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVCARD", kSetOrAction, jvcard_handler},
     {"AT+JVGMQH", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+UPDATEAPPS", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLC", kSetOrAction, pending_family_handler},
+    {"AT+JVLC", kSetOrAction, set_language_handler},
     {"AT+JVRIC", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+SGDJZ", kSetOrAction, pending_family_handler},
     {"AT+JVCCM", kSetOrAction, jvccm_handler},
     {"AT+ONLINE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVLANGUAGE", kSetOrAction, pending_family_handler},
+    {"AT+JVLANGUAGE", kSetOrAction, set_default_language_handler},
     {"AT+JVFLIGHT", kSetOrAction, pending_family_handler},
     {"AT+JVFEATURE", kSetOrAction, pending_family_handler},
     {"AT+JVZSJ", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVIICRC", kSetOrAction, jvzsj_iicrc_handler},  // not specified further
     {"AT+JVAUDIO", kSetOrAction, i2c_device_test_handler},
     {"AT+JVZWSB", kSetOrAction, jvzwsb_handler},
-    {"AT+PEMUKP", kSetOrAction, pending_family_handler},
+    {"AT+PEMUKP", kSetOrAction, RSA_key_handler},
     {"AT+JVCONNWIFI", kSetOrAction, pending_family_handler},
     {"AT+JVDW", kSetOrAction, pending_family_handler},
     {"AT+JVSCAN", kSetOrAction, unspecified_command_handler},  // not specified further
     {"AT+JVLIFE", kSetOrAction, unspecified_command_handler},  // not specified further
-    {"AT+JVPROP", kSetOrAction, pending_family_handler},
+    {"AT+JVPROP", kSetOrAction, property_set_handler},
     {"AT+JVSIMT", kSetOrAction, pending_family_handler},
     {"AT+JVTS", kSetOrAction, jvts_handler},
     {"AT+EADC", kSetOrAction, pending_family_handler},
     {"AT+EALT", kSetOrAction, mic_echo_handler},
-    {"AT+EGMR", kSetOrAction, pending_family_handler},
+    {"AT+EGMR", kSetOrAction, imei_and_pcb_code_on_handler},
     {"AT+EMBT", kSetOrAction, pending_family_handler},
     {"AT+JVWLAN", kSetOrAction, pending_family_handler},
     {"AT+JVGPS", kSetOrAction, pending_family_handler},
@@ -130,7 +133,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+MMILED", kSetOrAction, pending_family_handler},
     {"AT+JVCOM", kSetOrAction, pending_family_handler},
     {"AT+JVMT", kSetOrAction, echo_handler},
-    {"AT+JVTDNV", kSetOrAction, pending_family_handler},
+    {"AT+JVTDNV", kSetOrAction, nv_66024_handler},
     {"AT+JVLOGAT", kSetOrAction, pending_family_handler},
     {"AT+JVQHZS", kSetOrAction, pending_family_handler},
     {"AT+JVLIGHT", kSetOrAction, pending_family_handler},
@@ -149,7 +152,7 @@ constinit const CommandEntry command_table[COMMAND_COUNT] = {
     {"AT+JVMEID", kSetOrAction, pending_family_handler},
     {"AT+JVMPPS", kSetOrAction, jvmpps_handler},
     {"AT+JVDLJCS", kSetOrAction, pending_family_handler},
-    {"AT+JVSYS", kSetOrAction, pending_family_handler},
+    {"AT+JVSYS", kSetOrAction, change_sig_system_handler},
     {"AT+JVEFS", kSetOrAction, pending_family_handler},
     {"AT+JVVSIM", kSetOrAction, pending_family_handler},
     {"AT+JVDPDT", kSetOrAction, pending_family_handler},

@@ -23,12 +23,19 @@ constexpr int kReopenTries = 3;
 bool is_a(char c) { return c == 'A' || c == 'a'; }
 bool is_t(char c) { return c == 'T' || c == 't'; }
 
+// Re-opens since the port last gave data. A hung-up port can open fine and fail again at
+// once; such a re-open counts as a failed try, so a lasting hang-up ends the service instead
+// of spinning.
+int reopens_without_data = 0;
+
 // Closes the descriptor that failed and opens its port again; ends the process when three
 // tries in a row fail.
 void reopen_port(SerialDevice* device, int index) {
   ATCI_LOGE(" Error in serail read:%d", errno);
   ::close(device->fd[index]);
-  for (int i = 0; i < kReopenTries; ++i) {
+  device->fd[index] = -1;
+  while (reopens_without_data < kReopenTries) {
+    ++reopens_without_data;
     device->fd[index] = open_serial_device(device, device->dev_name[index]);
     if (device->fd[index] >= 0) {
       ATCI_LOGD("The FD is reopen successfully");
@@ -37,6 +44,19 @@ void reopen_port(SerialDevice* device, int index) {
   }
   ATCI_LOGE("The process is terminated due to fatal error");
   std::exit(1);
+}
+
+// The station hung up or the connection broke: the service is over. On the phone init starts
+// the daemon again for the next station.
+[[noreturn]] void end_of_connection(ssize_t received) {
+  const int error = errno;
+  if (received == 0) {
+    ATCI_LOGI("The station closed the connection\n");
+  } else {
+    ATCI_LOGE("Failed to receive command !!!\n");
+    ATCI_LOGE("receive error: %d", error);
+  }
+  std::exit(0);
 }
 
 }  // namespace
@@ -57,11 +77,10 @@ char* readline(SerialDevice* device) {
 
     int count;
     if (is_socket_transport()) {
-      count = static_cast<int>(::recv(device->fd[0], buffer, kReadSize, 0)) + 1;
-      if (count < 0) {
-        ATCI_LOGD("Failed to receive command !!!\n");
-        return device->line;
-      }
+      const ssize_t received = ::recv(device->fd[0], buffer, kReadSize, 0);
+      if (received < 0 && errno == EINTR) continue;
+      if (received <= 0) end_of_connection(received);
+      count = static_cast<int>(received) + 1;
       ATCI_LOGD("readCount = %d !!!\n", count);
     } else {
       ATCI_LOGD("Wait for select data from USB");
@@ -101,6 +120,7 @@ char* readline(SerialDevice* device) {
         reopen_port(device, index);
         return nullptr;
       }
+      reopens_without_data = 0;
     }
 
     ATCI_LOGD("state %d with %d:%d", device->state, 0, std::toupper(static_cast<unsigned char>(buffer[0])));

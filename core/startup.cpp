@@ -73,20 +73,23 @@ int serve_uart() {
 
 int serve_socket() {
   std::strcpy(serial.dev_name[0], "socket");
-  // The listening socket lives as long as the daemon: one station connection per run.
+  // One station connection per run: when it ends, so does the daemon, and init starts it again.
   const int listener = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
   if (listener < 0) fail_socket("Failed to create socket!!!\n");
   const int on = 1;
   ::setsockopt(listener, SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
   sockaddr_in addr{};
   addr.sin_family = AF_INET;
-  addr.sin_addr.s_addr = htonl(INADDR_ANY);
   addr.sin_port = htons(static_cast<uint16_t>(platform_tcp_port()));
-  if (::bind(listener, reinterpret_cast<sockaddr*>(&addr), sizeof addr) != 0)
+  if (platform_tcp_listen_address(&addr.sin_addr.s_addr) != 0 ||
+      ::bind(listener, reinterpret_cast<sockaddr*>(&addr), sizeof addr) != 0)
     fail_socket("Bind socket error!!!\n");
   if (::listen(listener, kListenBacklog) != 0) fail_socket("Listen socket error!!!\n");
   ATCI_LOGI("start accept\n");
   serial.fd[0] = ::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC);
+  // Never accepted on again: a station that calls meanwhile is refused at once, rather than
+  // left waiting in the queue of a daemon that will not answer it.
+  ::close(listener);
   ATCI_LOGI("accept finish\n");
   if (serial.fd[0] < 0) ATCI_LOGE("Server accept failed!!!\n");
   readerLoop(&serial);

@@ -1,5 +1,5 @@
-"""The emulated phone: a device root made from the template, a harmless shell, pseudo-terminals
-for the serial ports, and the atcid daemon serving on them.
+"""The emulated phone: a device root made from the template, its shell (a static mksh and busybox
+tools), pseudo-terminals for the serial ports, and the atcid daemon serving on them.
 
 Used by the launcher (atcid-emu) and by the integration tests.
 """
@@ -23,11 +23,13 @@ DIRECTORIES = (
     "storage/sdcard1", "system/bin", "system/xbin", "tmp", ".emu",
 )
 
-# Busybox applets installed as the phone's shell tools. Anything that could act on the real
+# Busybox applets installed as the phone's shell tools. The daemon's shell runs in namespaces
+# of its own, so none of them could reach the machine; still, tools that would act on a whole
 # machine (reboot, poweroff, halt, date, hwclock, insmod, rmmod, modprobe, mount, umount,
-# chroot, swapon, ifconfig, ip, route, nsenter, unshare, sync, ...) is deliberately absent.
+# chroot, swapon, ifconfig, ip, route, nsenter, unshare, sync, ...) and busybox's own shells
+# are left out: the phone's tools of those names are stand-in scripts of the template.
 SAFE_APPLETS = (
-    "sh", "ash", "awk", "basename", "cat", "chmod", "cmp", "cp", "cut", "dd", "diff", "dirname",
+    "awk", "basename", "cat", "chmod", "cmp", "cp", "cut", "dd", "diff", "dirname",
     "du", "echo", "env", "expr", "false", "find", "grep", "head", "id", "kill", "killall", "ln",
     "ls", "md5sum", "mkdir", "mktemp", "mv", "od", "pgrep", "pidof", "pkill", "printf", "ps",
     "pwd", "readlink", "realpath", "rm", "rmdir", "sed", "seq", "sleep", "sort", "stat", "tail",
@@ -35,13 +37,24 @@ SAFE_APPLETS = (
 )
 
 BUSYBOX_CANDIDATES = ("/bin/busybox", "/usr/bin/busybox")
+# The phone's shell is mksh; Debian's mksh package has a static build. It finds every command
+# through PATH, so a stand-in script always runs, never a built-in applet of the same name.
+MKSH_CANDIDATES = ("/bin/mksh-static", "/usr/lib/klibc/bin/mksh")
 
 
-def find_busybox():
-    for path in BUSYBOX_CANDIDATES:
+def _first_existing(paths):
+    for path in paths:
         if os.path.exists(path):
             return path
     return None
+
+
+def find_busybox():
+    return _first_existing(BUSYBOX_CANDIDATES)
+
+
+def find_mksh():
+    return _first_existing(MKSH_CANDIDATES)
 
 
 def set_property(root, name, value):
@@ -51,7 +64,7 @@ def set_property(root, name, value):
     path.write_bytes(value.encode() if isinstance(value, str) else value)
 
 
-def make_root(root, busybox=None):
+def make_root(root, busybox=None, mksh=None):
     """Creates a fresh device root at `root` from the template and installs the shell."""
     root = Path(root)
     if root.exists():
@@ -59,22 +72,25 @@ def make_root(root, busybox=None):
     shutil.copytree(TEMPLATE, root, symlinks=True)
     for directory in DIRECTORIES:
         (root / directory).mkdir(parents=True, exist_ok=True)
-    install_shell(root, busybox or find_busybox())
+    install_shell(root, mksh or find_mksh(), busybox or find_busybox())
     return root
 
 
-def install_shell(root, busybox):
-    """Installs a static busybox as /system/bin/busybox with links for the safe applets only."""
-    if busybox is None:
-        return False
+def install_shell(root, mksh, busybox):
+    """Installs the static mksh as /system/bin/sh, and a static busybox as /system/bin/busybox
+    with links for the listed applets that no stand-in of the template already provides."""
     bindir = Path(root) / "system/bin"
+    if mksh is not None:
+        shutil.copy(mksh, bindir / "sh")
+    if busybox is None:
+        return mksh is not None
     shutil.copy2(busybox, bindir / "busybox")
     listed = subprocess.run([busybox, "--list"], capture_output=True, text=True).stdout.split()
     for applet in SAFE_APPLETS:
         link = bindir / applet
-        if applet in listed and not link.exists():
+        if applet in listed and not link.exists() and not link.is_symlink():
             link.symlink_to("busybox")
-    return True
+    return mksh is not None
 
 
 def device_cmdline(root, text):
@@ -165,14 +181,53 @@ def prepare_mode(root, mode):
         raise ValueError(f"unknown mode {mode}")
 
 
-def start_daemon(binary, root, port=None, log=None):
+def start_daemon(binary, root, port=None, log=None, listen=None):
     env = {k: v for k, v in os.environ.items()
            if not k.startswith("ATCID_") or k == "ATCID_RESOLVER"}
     env["ATCID_ROOT"] = str(root)
     if port is not None:
         env["ATCID_PORT"] = str(port)
+    if listen is not None:
+        env["ATCID_LISTEN"] = str(listen)
     return subprocess.Popen([str(binary)], env=env, stdin=subprocess.DEVNULL,
                             stdout=log or subprocess.DEVNULL, stderr=log or subprocess.DEVNULL)
+
+
+def power_log_size(root):
+    try:
+        return (Path(root) / ".emu/power.log").stat().st_size
+    except FileNotFoundError:
+        return 0
+
+
+# The least time from one start of the daemon to the next, so a daemon that cannot serve is
+# never restarted in a tight loop: short after a normal ending (a station hung up), longer
+# after a failure (its port cannot be opened or used).
+RESTART_PAUSE = 0.05
+RESTART_PAUSE_FAILED = 1.0
+
+
+def run_service(binary, root, log_path, port=None, listen=None, on_start=None, stopping=None):
+    """Runs the daemon on `root` as the phone's init runs its service: whenever it ends on its
+    own it is started again on the same root, so a station can hang up and connect again.
+    Returns the last status once the daemon ended by a power request (.emu/power.log grew
+    while it ran) or once `stopping` (a threading.Event) is set. `on_start` gets each process."""
+    stopping = stopping or threading.Event()
+    while True:
+        before = power_log_size(root)
+        started = time.monotonic()
+        with open(log_path, "ab") as log:
+            proc = start_daemon(binary, root, port=port, log=log, listen=listen)
+        if on_start is not None:
+            on_start(proc)
+        if stopping.is_set():
+            proc.terminate()
+        status = proc.wait()
+        if stopping.is_set() or power_log_size(root) > before:
+            return status
+        pause = RESTART_PAUSE if status == 0 else RESTART_PAUSE_FAILED
+        if stopping.wait(max(0.0, pause - (time.monotonic() - started))):
+            return status
 
 
 def wait_for_log(path, text, proc=None, timeout=10.0):

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <cstdio>
 #include <dirent.h>
 #include <sys/stat.h>
@@ -45,3 +46,6 @@ int platform_system(const char* command);
 
 // TCP port of the socket transport.
 int platform_tcp_port();
+// IPv4 address (network byte order) the socket transport listens on: all interfaces on the
+// phone. 0, or -1 when the configured address is not usable.
+int platform_tcp_listen_address(uint32_t* address);

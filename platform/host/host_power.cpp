@@ -1,5 +1,6 @@
 // Power requests of the emulated phone: recorded, then the process ends as the phone would
 // go away. reboot(2) is never called by a host build.
+#include <arpa/inet.h>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -45,4 +46,20 @@ int platform_tcp_port() {
   char* end = nullptr;
   const long port = std::strtol(text, &end, 10);
   return *end == '\0' && port > 0 && port < 65536 ? static_cast<int>(port) : 6888;
+}
+
+// The emulated phone is not open to the network unless asked: loopback by default.
+int platform_tcp_listen_address(uint32_t* address) {
+  const char* text = std::getenv("ATCID_LISTEN");
+  if (text == nullptr || *text == '\0') {
+    *address = htonl(INADDR_LOOPBACK);
+    return 0;
+  }
+  in_addr addr{};
+  if (::inet_pton(AF_INET, text, &addr) != 1) {
+    std::fprintf(stderr, "atcid: ATCID_LISTEN '%s' is not an IPv4 address\n", text);
+    return -1;
+  }
+  *address = addr.s_addr;
+  return 0;
 }

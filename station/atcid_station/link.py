@@ -8,6 +8,7 @@ import time
 
 DEFAULT_TCP_PORT = 6888
 DEFAULT_BAUD = 115200
+REFUSED_RETRY = 1.0
 
 
 class LinkError(Exception):
@@ -99,7 +100,7 @@ class TcpLink(Link):
         self.name = f"tcp://{host}:{port}"
         started = time.monotonic()
         try:
-            self.sock = socket.create_connection((host, port), timeout=connect_timeout)
+            self.sock = self._connect(host, port, connect_timeout, started)
         except socket.timeout:
             raise LinkError(f"{self.name}: connection timed out after "
                             f"{time.monotonic() - started:.1f} s") from None
@@ -111,6 +112,18 @@ class TcpLink(Link):
             raise LinkError(f"{self.name}: {e.strerror or e}") from None
         self.sock.settimeout(None)
         self._start()
+
+    @staticmethod
+    def _connect(host, port, timeout, started):
+        # The phone serves one station per run and is started again when it hangs up, so a
+        # refusal right after another station left is retried for a moment.
+        while True:
+            try:
+                return socket.create_connection((host, port), timeout=timeout)
+            except ConnectionRefusedError:
+                if time.monotonic() - started >= REFUSED_RETRY:
+                    raise
+                time.sleep(0.05)
 
     def _read(self):
         return self.sock.recv(65536)

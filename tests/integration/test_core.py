@@ -8,7 +8,7 @@ import time
 import pytest
 
 import emulator
-from conftest import BINARY, BLOCK, TcpPhone, TtyPhone, framed_tcp, framed_tty
+from conftest import BINARY, BLOCK, TcpPhone, TtyPhone, framed_tcp, framed_tty, free_port
 
 # Commands whose rows have no behaviour of their own answer "Not Implement" in every
 # accepted form; they exercise the dispatcher without depending on any command family.
@@ -82,6 +82,64 @@ def test_tty_cable_pulled_and_reopen_fails(usb_phone):
     usb_phone.bridge.hang_up()
     assert usb_phone.wait() == 1
     assert "The process is terminated due to fatal error" in usb_phone.log()
+
+
+def test_tty_port_that_fails_again_after_each_reopen(device_root):
+    # A port that opens fine but reads nothing (a hung-up gadget port; here /dev/null) counts
+    # each useless re-open as a failed try instead of spinning.
+    emulator.prepare_mode(device_root, "usb")
+    emulator.link_port(device_root, "ttyGS0", "/dev/null")
+    assert run_daemon(device_root) == 1
+    assert "The process is terminated due to fatal error" in \
+        (device_root / ".emu/atcid.log").read_text()
+
+
+def test_tcp_station_hang_up_ends_the_daemon(tcp_phone):
+    assert tcp_phone.command(b"ATI") == b"ATI\r\nERROR\r\n"
+    tcp_phone.sock.close()
+    assert tcp_phone.wait() == 0
+    assert "The station closed the connection" in tcp_phone.log()
+
+
+def test_tcp_end_of_service_command_ends_the_daemon(tcp_phone):
+    # The answer comes first; the next receive on the closed descriptor ends the daemon.
+    line = b"AT+JVSSID=0"
+    assert tcp_phone.command(line) == framed_tcp(line, b"", b"Not Implement")
+    assert tcp_phone.wait() == 0
+    assert "Failed to receive command !!!" in tcp_phone.log()
+    assert "receive error: 9" in tcp_phone.log()
+
+
+def listening_address(port):
+    """The local address of the socket listening on `port`, as /proc/net/tcp shows it."""
+    for line in open("/proc/net/tcp").readlines()[1:]:
+        fields = line.split()
+        address, local_port = fields[1].split(":")
+        if int(local_port, 16) == port and fields[3] == "0A":
+            return address
+    return None
+
+
+@pytest.mark.parametrize("listen, address", [
+    (None, "0100007F"),       # 127.0.0.1 unless asked
+    ("0.0.0.0", "00000000"),  # every interface
+    ("localhost", None),      # not an address: the daemon does not serve
+])
+def test_tcp_listen_address(device_root, listen, address):
+    emulator.prepare_mode(device_root, "tcp")
+    port = free_port()
+    with open(device_root / ".emu/atcid.log", "ab") as log:
+        proc = emulator.start_daemon(BINARY, device_root, port=port, log=log, listen=listen)
+    try:
+        if address is None:
+            assert proc.wait(timeout=10) == 1
+            assert "Bind socket error!!!" in (device_root / ".emu/atcid.log").read_text()
+            return
+        assert emulator.wait_for_log(device_root / ".emu/atcid.log", "start accept", proc)
+        assert listening_address(port) == address
+    finally:
+        proc.kill()
+        proc.wait()
 
 
 def test_tcp_blocks_are_padded_and_paced(tcp_phone):

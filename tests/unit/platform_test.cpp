@@ -2,9 +2,13 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <filesystem>
 #include <string>
+#include <sys/stat.h>
+#include <thread>
 
+#include "platform/host/host_hooks.h"
 #include "platform/host/host_root.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
@@ -106,4 +110,42 @@ TEST_F(PlatformTest, ShellHookRecordsInsteadOfRunning) {
   ASSERT_EQ(shell_commands().size(), 1u);
   EXPECT_EQ(shell_commands()[0], "echo hi > /data/x");
   EXPECT_FALSE(exists("/data/x"));
+}
+
+// The real shell: a static mksh as the root's /system/bin/sh, run in the namespaces.
+TEST_F(PlatformTest, ShellCallsRunInTheRootSideBySide) {
+  host_set_shell_hook(nullptr);
+  EXPECT_EQ(platform_system("exit 0"), 127 << 8);  // no /system/bin/sh in this root yet
+  const fs::path mksh = "/bin/mksh-static";
+  if (!fs::exists(mksh)) GTEST_SKIP() << "no static mksh (package mksh)";
+  make_dir("/system/bin");
+  fs::copy_file(mksh, host_path("/system/bin/sh"));
+  make_dir("/data");
+  ASSERT_EQ(::mkfifo(host_path("/data/fifo").c_str(), 0600), 0);
+
+  // The first call waits for what the second writes: calls must not wait for one another.
+  int first = -1;
+  std::thread reader([&] {
+    first = platform_system(
+        "exec 3<> /data/fifo; echo > /data/started; read line <&3; echo \"$line\" > /data/got; "
+        "exit 3");
+  });
+  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(20);
+  while (!exists("/data/started") && std::chrono::steady_clock::now() < deadline)
+    std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  std::thread watchdog([&] {  // a serialising shell would leave the reader waiting for good
+    while (!exists("/data/got") && std::chrono::steady_clock::now() < deadline)
+      std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    UniqueFd fifo(::open(host_path("/data/fifo").c_str(), O_WRONLY | O_NONBLOCK));
+    if (fifo.ok()) [[maybe_unused]] const ssize_t n = ::write(fifo.get(), "late\n", 5);
+  });
+  EXPECT_EQ(platform_system("echo go 1<> /data/fifo"), 0);
+  reader.join();
+  watchdog.join();
+  EXPECT_EQ(first, 3 << 8);
+  EXPECT_EQ(read_file("/data/got"), "go\n");
+  // Files the shell makes land in the root, not on the machine.
+  EXPECT_EQ(platform_system("echo inside > /etc-probe"), 0);
+  EXPECT_EQ(read_file("/etc-probe"), "inside\n");
+  EXPECT_FALSE(fs::exists("/etc-probe"));
 }
