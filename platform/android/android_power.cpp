@@ -2,6 +2,7 @@
 // anything that runs on a development machine.
 #include <cerrno>
 #include <ctime>
+#include <netinet/in.h>
 #include <sys/reboot.h>
 #include <unistd.h>
 
@@ -34,3 +35,8 @@ void platform_power_off() {
 }
 
 int platform_tcp_port() { return 6888; }
+
+int platform_tcp_listen_address(uint32_t* address) {
+  *address = htonl(INADDR_ANY);
+  return 0;
+}
