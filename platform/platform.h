@@ -40,6 +40,10 @@ void platform_log_write(int priority, const char* tag, const char* text);
 // Runs a command text as system(3) would and returns its wait status.
 int platform_system(const char* command);
 
+// Commits written data to storage before the link or the power goes away. A host build
+// flushes only the file system of the device root.
+void platform_sync();
+
 // The phone goes away: neither returns.
 [[noreturn]] void platform_restart();
 [[noreturn]] void platform_power_off();

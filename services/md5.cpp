@@ -33,10 +33,10 @@ inline void step(uint32_t& a, uint32_t& b, uint32_t& c, uint32_t& d, const uint3
   uint32_t f;
   int k;
   if constexpr (Round == 0) {
-    f = (b & c) | (~b & d);
+    f = d ^ (b & (c ^ d));  // (b & c) | (~b & d)
     k = i;
   } else if constexpr (Round == 1) {
-    f = (d & b) | (~d & c);
+    f = c ^ (d & (b ^ c));  // (d & b) | (~d & c)
     k = (5 * i + 1) % 16;
   } else if constexpr (Round == 2) {
     f = b ^ c ^ d;
@@ -56,10 +56,15 @@ void transform(uint32_t state[4], const uint8_t block[64]) {
   uint32_t x[16];
   for (int i = 0; i < 16; ++i) x[i] = load_le32(block + 4 * i);
   uint32_t a = state[0], b = state[1], c = state[2], d = state[3];
-  // One loop per round keeps the round function out of the inner loop.
+  // One loop per round keeps the round function out of the inner loop; unrolled, every
+  // shift, sine constant and word index becomes an immediate.
+#pragma GCC unroll 16
   for (int i = 0; i < 16; ++i) step<0>(a, b, c, d, x, i);
+#pragma GCC unroll 16
   for (int i = 16; i < 32; ++i) step<1>(a, b, c, d, x, i);
+#pragma GCC unroll 16
   for (int i = 32; i < 48; ++i) step<2>(a, b, c, d, x, i);
+#pragma GCC unroll 16
   for (int i = 48; i < 64; ++i) step<3>(a, b, c, d, x, i);
   state[0] += a;
   state[1] += b;

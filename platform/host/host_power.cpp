@@ -37,6 +37,9 @@ PowerHook g_power_hook = nullptr;
 
 void host_set_power_hook(PowerHook hook) { g_power_hook = hook; }
 
+// sync(2) would flush every file system of the machine; the phone's data lives in the root.
+void platform_sync() { ::syncfs(host_root_fd()); }
+
 void platform_restart() { go_away("restart"); }
 void platform_power_off() { go_away("power-off"); }
 

@@ -5,10 +5,12 @@ Each byte travels as two characters, high nibble first, nibble n as the characte
 """
 
 import hashlib
+import re
 import sys
 import time
 
 MAX_NAME = 23
+_NAME = re.compile(r"[A-Za-z0-9._+@%=:-]+")
 # Serial lines stay far below the terminal's 4096-byte line buffer and the phone's
 # 1100-character read; an even count keeps every pair within one read.
 SERIAL_LINE_CHARS = 1024
@@ -31,12 +33,11 @@ def decode(chars):
 
 
 def check_name(name):
+    """The names the phone takes: it stores them lower-cased and hands them to a shell."""
     if not 1 <= len(name) <= MAX_NAME:
         raise ValueError(f"the name must be 1 to {MAX_NAME} characters")
-    if "/" in name or name in (".", ".."):
-        raise ValueError("the name must be a plain file name")
-    if any(c in name for c in ",\r\n") or not name.isprintable():
-        raise ValueError("the name must not hold commas, line ends or control characters")
+    if name in (".", "..") or not _NAME.fullmatch(name):
+        raise ValueError("the name may hold only letters, digits and ._-+@%=:")
 
 
 class Progress:
