@@ -23,6 +23,8 @@ constexpr PhonePowerOps kPhoneOps{sync_all, reboot_kernel, property_set, sleep_m
 
 }  // namespace
 
+void platform_sync() { ::sync(); }
+
 // Still here: the station sees the link drop and init starts the daemon again.
 void platform_restart() {
   phone_power_request(kPhoneOps, PowerRequest::restart);
