@@ -20,6 +20,7 @@
 
 #include "core/serial.h"
 #include "tests/unit/device_root.h"
+#include "tests/unit/qemu_skips.h"
 
 namespace {
 
@@ -88,7 +89,11 @@ class QmiClientTest : public DeviceRootTest {
   // Every request must leave no answer outstanding and no transport thread behind.
   void expect_settled(const std::string& what) {
     EXPECT_EQ(qmi_pending.load(), 0) << what;
-    EXPECT_EQ(thread_count(), threads_) << what;
+    // Not under qemu-user: its host threads outlive the guest's joins for a while, so the
+    // count is off in either direction (kQemuListsJoinedThreads).
+    if (!under_qemu_user()) {
+      EXPECT_EQ(thread_count(), threads_) << what;
+    }
   }
 
   static int read_nv(uint32_t item, uint8_t opt0 = 0, uint8_t opt1 = 0) {
