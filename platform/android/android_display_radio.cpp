@@ -1,9 +1,10 @@
 // The kernel interfaces of the display and FM tests on the phone: frame-buffer blanking and
 // the Video4Linux tuner, and the partial wake lock.
-#include <cstring>
 #include <linux/fb.h>
 #include <linux/videodev2.h>
 #include <sys/ioctl.h>
+
+#include <cstring>
 
 #include "platform/android/android_wake_lock.h"
 #include "platform/platform.h"

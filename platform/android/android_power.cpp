@@ -1,12 +1,14 @@
 // Restart and power-off on the phone: reboot(2) after sync(). This file is never built into
 // anything that runs on a development machine.
-#include <cerrno>
-#include <ctime>
+#include "platform/android/android_power.h"
+
 #include <netinet/in.h>
 #include <sys/reboot.h>
 #include <unistd.h>
 
-#include "platform/android/android_power.h"
+#include <cerrno>
+#include <ctime>
+
 #include "platform/platform.h"
 
 namespace {

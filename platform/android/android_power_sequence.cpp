@@ -1,6 +1,7 @@
+#include <linux/reboot.h>
+
 #include <cerrno>
 #include <cstring>
-#include <linux/reboot.h>
 
 #include "core/log.h"
 #include "platform/android/android_power.h"

@@ -47,9 +47,9 @@ service_object_type kro_get_service_object_internal_v01(int idl_major, int idl_m
 
 int client_get_service_list(service_object_type service, service_info* list, unsigned* num_entries,
                             unsigned* num_services) {
-  return vendor::qmi_client_get_service_list(
-      theirs(service), reinterpret_cast<vendor::qmi_service_info*>(list), num_entries,
-      num_services);
+  return vendor::qmi_client_get_service_list(theirs(service),
+                                             reinterpret_cast<vendor::qmi_service_info*>(list),
+                                             num_entries, num_services);
 }
 
 int client_init(const service_info* info, service_object_type service, client_type* client) {
@@ -69,9 +69,9 @@ int client_send_msg_async(client_type client, unsigned msg_id, const void* req, 
   if (pending == nullptr) return INTERNAL_ERR;
   vendor::qmi_txn_handle handle = nullptr;
   // The library copies the request before it returns; it never writes it.
-  const int rc = vendor::qmi_client_send_msg_async(theirs(client), msg_id, const_cast<void*>(req),
-                                                   req_len, resp, resp_len, on_response, pending,
-                                                   &handle);
+  const int rc =
+      vendor::qmi_client_send_msg_async(theirs(client), msg_id, const_cast<void*>(req), req_len,
+                                        resp, resp_len, on_response, pending, &handle);
   if (rc != NO_ERR) {
     delete pending;
     return rc;

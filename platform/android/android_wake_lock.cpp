@@ -1,10 +1,11 @@
 #include "platform/android/android_wake_lock.h"
 
+#include <fcntl.h>
+#include <unistd.h>
+
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
-#include <fcntl.h>
-#include <unistd.h>
 
 #include "platform/unique_fd.h"
 

@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/audio_ftm.h"
+
+#include <cstdlib>
 
 namespace vendor {
 

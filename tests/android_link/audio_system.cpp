@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/audio_system.h"
+
+#include <cstdlib>
 
 namespace android {
 

@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/kro_qmi_service.h"
+
+#include <cstdlib>
 
 namespace vendor {
 

@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/pemufactory.h"
+
+#include <cstdlib>
 
 namespace vendor {
 

@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/pemusensortest.h"
+
+#include <cstdlib>
 
 namespace vendor {
 

@@ -1,6 +1,6 @@
-#include <cstdlib>
-
 #include "platform/android/vendor/qmi_cci.h"
+
+#include <cstdlib>
 
 namespace vendor {
 

@@ -1,5 +1,7 @@
 // The phone's log: the level table against liblog's priorities, and the texts as liblog gets
 // them, through a fake __android_log_print.
+#include "core/log.h"
+
 #include <android/log.h>
 #include <gtest/gtest.h>
 
@@ -7,8 +9,6 @@
 #include <cstdio>
 #include <string>
 #include <vector>
-
-#include "core/log.h"
 
 namespace {
 

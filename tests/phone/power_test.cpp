@@ -1,8 +1,8 @@
 // The phone's restart and power-off sequence, against fake system calls.
 #include <gtest/gtest.h>
+#include <linux/reboot.h>
 
 #include <cerrno>
-#include <linux/reboot.h>
 #include <string>
 #include <vector>
 
@@ -38,14 +38,17 @@ TEST(PhonePower, SyncThenRebootThenInitWhenTheKernelRefuses) {
     std::vector<std::string> calls;
   };
   const Row rows[] = {
-      {PowerRequest::restart, 0,
+      {PowerRequest::restart,
+       0,
        {"sync", reboot_call(LINUX_REBOOT_CMD_RESTART), "setprop sys.powerctl reboot",
         "sleep 10000"}},
-      {PowerRequest::power_off, 0,
+      {PowerRequest::power_off,
+       0,
        {"sync", reboot_call(LINUX_REBOOT_CMD_POWER_OFF), "setprop sys.powerctl shutdown",
         "sleep 10000"}},
       // init refused too: no wait for nothing
-      {PowerRequest::restart, -1,
+      {PowerRequest::restart,
+       -1,
        {"sync", reboot_call(LINUX_REBOOT_CMD_RESTART), "setprop sys.powerctl reboot"}},
   };
   for (const Row& row : rows) {

@@ -47,9 +47,8 @@ qmi_client_error_type qmi_client_init(qmi_service_info* info, qmi_idl_service_ob
 }
 // Answers at once, as a library whose response thread wins the race does; a message id of 99
 // is refused.
-qmi_client_error_type qmi_client_send_msg_async(qmi_client_type client, unsigned msg_id,
-                                                void* req, unsigned req_len, void* resp,
-                                                unsigned resp_len,
+qmi_client_error_type qmi_client_send_msg_async(qmi_client_type client, unsigned msg_id, void* req,
+                                                unsigned req_len, void* resp, unsigned resp_len,
                                                 qmi_client_recv_msg_async_cb resp_cb,
                                                 void* resp_cb_data, qmi_txn_handle*) {
   if (msg_id == 99) return -2;

@@ -25,8 +25,8 @@ struct qmi_service_info {
 
 using qmi_client_ind_cb = void (*)(qmi_client_type client, unsigned msg_id, void* ind_buf,
                                    unsigned ind_buf_len, void* ind_cb_data);
-using qmi_client_recv_msg_async_cb = void (*)(qmi_client_type client, unsigned msg_id,
-                                              void* resp, unsigned resp_len, void* resp_cb_data,
+using qmi_client_recv_msg_async_cb = void (*)(qmi_client_type client, unsigned msg_id, void* resp,
+                                              unsigned resp_len, void* resp_cb_data,
                                               qmi_client_error_type transp_err);
 
 qmi_client_error_type qmi_client_get_service_list(qmi_idl_service_object_type service,
@@ -35,9 +35,8 @@ qmi_client_error_type qmi_client_get_service_list(qmi_idl_service_object_type se
 qmi_client_error_type qmi_client_init(qmi_service_info* info, qmi_idl_service_object_type service,
                                       qmi_client_ind_cb ind_cb, void* ind_cb_data,
                                       qmi_client_os_params* os_params, qmi_client_type* client);
-qmi_client_error_type qmi_client_send_msg_async(qmi_client_type client, unsigned msg_id,
-                                                void* req, unsigned req_len, void* resp,
-                                                unsigned resp_len,
+qmi_client_error_type qmi_client_send_msg_async(qmi_client_type client, unsigned msg_id, void* req,
+                                                unsigned req_len, void* resp, unsigned resp_len,
                                                 qmi_client_recv_msg_async_cb resp_cb,
                                                 void* resp_cb_data, qmi_txn_handle* txn);
 qmi_client_error_type qmi_client_release(qmi_client_type client);
