@@ -110,7 +110,11 @@ char* readline(SerialDevice* device) {
       }
       index = FD_ISSET(device->fd[0], &readable) ? 0 : 1;
       ATCI_LOGD("Read data from USB:%d:%d", index, device->fd[index]);
-      device->active_port = index;
+      {
+        // Stream workers read it when they write a line.
+        const std::lock_guard lock(transport_write_lock);
+        device->active_port = index;
+      }
       current = device->fd[index];
 
       ATCI_LOGD("Wait for read data from USB :%d", current);

@@ -15,6 +15,7 @@
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "tests/unit/device_root.h"
+#include "tests/unit/qemu_skips.h"
 
 namespace fs = std::filesystem;
 
@@ -25,6 +26,8 @@ class ResolverTest : public DeviceRootTest, public ::testing::WithParamInterface
  protected:
   void SetUp() override {
     DeviceRootTest::SetUp();
+    if (!GetParam() && host_walk_resolver_in_use() && under_qemu_user())
+      GTEST_SKIP() << kQemuHasNoOpenat2;
     host_use_walk_resolver(GetParam());
   }
   void TearDown() override {
@@ -161,6 +164,7 @@ TEST_F(PlatformTest, ShellHookRecordsInsteadOfRunning) {
 
 // The real shell: a static mksh as the root's /system/bin/sh, run in the namespaces.
 TEST_F(PlatformTest, ShellCallsRunInTheRootSideBySide) {
+  if (under_qemu_user()) GTEST_SKIP() << kQemuRefusesUserNamespaces;
   host_set_shell_hook(nullptr);
   EXPECT_EQ(platform_system("exit 0"), 127 << 8);  // no /system/bin/sh in this root yet
   const fs::path mksh = "/bin/mksh-static";

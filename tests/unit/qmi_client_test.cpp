@@ -21,6 +21,7 @@
 #include "core/serial.h"
 #include "platform/host/host_hooks.h"
 #include "tests/unit/device_root.h"
+#include "tests/unit/qemu_skips.h"
 
 namespace {
 

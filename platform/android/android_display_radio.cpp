@@ -1,0 +1,28 @@
+// The kernel interfaces of the display and FM tests on the phone: frame-buffer blanking and
+// the Video4Linux tuner, and the partial wake lock.
+#include <linux/fb.h>
+#include <linux/videodev2.h>
+#include <sys/ioctl.h>
+
+#include <cstring>
+
+#include "platform/android/android_wake_lock.h"
+#include "platform/platform.h"
+
+int platform_fb_blank(int fd, int mode) { return ::ioctl(fd, FBIOBLANK, mode); }
+
+// Tuner 0's signal strength; the control's result is the caller's to ignore.
+int phone_fm_tuner_signal(int fd, int* signal) {
+  v4l2_tuner tuner;
+  std::memset(&tuner, 0, sizeof tuner);
+  tuner.index = 0;
+  const int rc = ::ioctl(fd, VIDIOC_G_TUNER, &tuner);
+  *signal = tuner.signal;
+  return rc;
+}
+
+int acquire_wake_lock(int lock, const char* id) {
+  return wake_lock_acquire_in(kSysPower, lock, id);
+}
+
+int release_wake_lock(const char* id) { return wake_lock_release_in(kSysPower, id); }
