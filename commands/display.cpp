@@ -72,7 +72,7 @@ int sleep_now(int fb) {
   run_shell("/system/bin/sh -c \"echo \"255\" > /sys/class/leds/lcd-backlight/brightness\"");
   run_shell("/system/bin/sh -c \"echo \"0\" > /sys/class/leds/lcd-backlight/brightness\"");
   run_shell("/system/bin/sh -c \"echo 1 > /sys/touchscreen/suspend_cmd\"");
-  if (platform_fb_blank(fb, FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
+  if (platform_fb_blank(fb, PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
   run_shell("/system/bin/sh -c \"echo \"mem\" > /sys/power/autosleep\"");
   return RESULT_DONE;
 }

@@ -165,7 +165,7 @@ int display_off() {
     ATCI_LOGE("cannot open %s", kFrameBuffer);
     return RESULT_ERROR;
   }
-  if (platform_fb_blank(fd.get(), FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
+  if (platform_fb_blank(fd.get(), PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
   return RESULT_OK;
 }
 

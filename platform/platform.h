@@ -64,7 +64,7 @@ int acquire_wake_lock(int type, const char* name);
 int release_wake_lock(const char* name);
 
 // The frame buffer's blank request (FBIOBLANK) on an open frame-buffer descriptor: 0, or -1.
-inline constexpr int FB_BLANK_POWERDOWN = 4;
+inline constexpr int PLATFORM_FB_BLANK_POWERDOWN = 4;
 int platform_fb_blank(int fd, int mode);
 
 // The FM tuner's signal strength: VIDIOC_G_TUNER for tuner 0 on the open radio device. 0 with

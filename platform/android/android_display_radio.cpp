@@ -11,14 +11,14 @@
 
 int platform_fb_blank(int fd, int mode) { return ::ioctl(fd, FBIOBLANK, mode); }
 
-// Tuner 0's signal strength; the control's result is the caller's to ignore.
-int phone_fm_tuner_signal(int fd, int* signal) {
+// Tuner 0's signal strength.
+int platform_fm_tuner_signal(int fd, int* signal) {
   v4l2_tuner tuner;
   std::memset(&tuner, 0, sizeof tuner);
   tuner.index = 0;
-  const int rc = ::ioctl(fd, VIDIOC_G_TUNER, &tuner);
-  *signal = tuner.signal;
-  return rc;
+  if (::ioctl(fd, VIDIOC_G_TUNER, &tuner) != 0) return -1;
+  *signal = static_cast<int>(tuner.signal);
+  return 0;
 }
 
 int acquire_wake_lock(int lock, const char* id) {

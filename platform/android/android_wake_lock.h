@@ -3,7 +3,8 @@
 // locks (keep the CPU running) exist. The power directory is /sys/power on the phone.
 #pragma once
 
-inline constexpr int PARTIAL_WAKE_LOCK = 1;
+#include "platform/platform.h"
+
 inline constexpr char kSysPower[] = "/sys/power";
 
 // The count written, or the negative errno; -EINVAL for any lock but PARTIAL_WAKE_LOCK.
