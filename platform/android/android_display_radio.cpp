@@ -1,12 +1,11 @@
 // The kernel interfaces of the display and FM tests on the phone: frame-buffer blanking and
-// the Video4Linux tuner, and the partial wake lock.
+// the Video4Linux tuner.
 #include <linux/fb.h>
 #include <linux/videodev2.h>
 #include <sys/ioctl.h>
 
 #include <cstring>
 
-#include "platform/android/android_wake_lock.h"
 #include "platform/platform.h"
 
 int platform_fb_blank(int fd, int mode) { return ::ioctl(fd, FBIOBLANK, mode); }
@@ -20,9 +19,3 @@ int platform_fm_tuner_signal(int fd, int* signal) {
   *signal = static_cast<int>(tuner.signal);
   return 0;
 }
-
-int acquire_wake_lock(int lock, const char* id) {
-  return wake_lock_acquire_in(kSysPower, lock, id);
-}
-
-int release_wake_lock(const char* id) { return wake_lock_release_in(kSysPower, id); }

@@ -1,33 +1,12 @@
-#include "platform/android/android_wake_lock.h"
+// The partial wake lock on the phone: libhardware_legacy.
+#include "platform/android/vendor/hardware_legacy_power.h"
+#include "platform/platform.h"
 
-#include <fcntl.h>
-#include <unistd.h>
+static_assert(PARTIAL_WAKE_LOCK == vendor::PARTIAL_WAKE_LOCK);
 
-#include <cerrno>
-#include <cstdio>
-#include <cstring>
-
-#include "platform/unique_fd.h"
-
-namespace {
-
-int write_name(const char* power_dir, const char* file, const char* id) {
-  if (id == nullptr || *id == '\0') return -EINVAL;
-  char path[128];
-  std::snprintf(path, sizeof path, "%s/%s", power_dir, file);
-  UniqueFd fd(::open(path, O_WRONLY | O_CLOEXEC));
-  if (!fd.ok()) return -errno;
-  const ssize_t n = ::write(fd.get(), id, std::strlen(id));
-  return n < 0 ? -errno : static_cast<int>(n);
+// Releases of the library answer success with 0 or with the bytes written to /sys/power.
+int acquire_wake_lock(int lock, const char* id) {
+  return vendor::acquire_wake_lock(lock, id) < 0 ? -1 : 0;
 }
 
-}  // namespace
-
-int wake_lock_acquire_in(const char* power_dir, int lock, const char* id) {
-  if (lock != PARTIAL_WAKE_LOCK) return -EINVAL;
-  return write_name(power_dir, "wake_lock", id);
-}
-
-int wake_lock_release_in(const char* power_dir, const char* id) {
-  return write_name(power_dir, "wake_unlock", id);
-}
+int release_wake_lock(const char* id) { return vendor::release_wake_lock(id) < 0 ? -1 : 0; }

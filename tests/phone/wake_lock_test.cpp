@@ -1,44 +1,39 @@
-// The legacy wake lock protocol against a directory that plays /sys/power.
+// The wake lock calls against a fake libhardware_legacy: the daemon's lock reaches the library
+// as it was asked for, and every success the library's releases give reads as 0.
 #include <gtest/gtest.h>
 
 #include <cerrno>
-#include <filesystem>
-#include <fstream>
-#include <sstream>
 #include <string>
 
-#include "platform/android/android_wake_lock.h"
-
-namespace fs = std::filesystem;
+#include "platform/android/vendor/hardware_legacy_power.h"
+#include "platform/platform.h"
 
 namespace {
-
-std::string contents(const fs::path& p) {
-  std::ifstream in(p);
-  std::stringstream s;
-  s << in.rdbuf();
-  return s.str();
-}
-
+std::string g_call;
+int g_result = 0;
 }  // namespace
 
-TEST(PhoneWakeLock, NameGoesToLockThenUnlockFile) {
-  char pattern[] = "/tmp/atcid-power-XXXXXX";
-  ASSERT_NE(::mkdtemp(pattern), nullptr);
-  const fs::path dir = pattern;
-  std::ofstream(dir / "wake_lock").close();
-  std::ofstream(dir / "wake_unlock").close();
+namespace vendor {
+int acquire_wake_lock(int lock, const char* id) {
+  g_call = "acquire " + std::to_string(lock) + " " + id;
+  return g_result;
+}
+int release_wake_lock(const char* id) {
+  g_call = std::string("release ") + id;
+  return g_result;
+}
+}  // namespace vendor
 
-  EXPECT_EQ(wake_lock_acquire_in(pattern, 2, "atcid"), -EINVAL);  // only partial locks
-  EXPECT_EQ(wake_lock_acquire_in(pattern, PARTIAL_WAKE_LOCK, ""), -EINVAL);
-  EXPECT_EQ(contents(dir / "wake_lock"), "");
-
-  EXPECT_EQ(wake_lock_acquire_in(pattern, PARTIAL_WAKE_LOCK, "atcid"), 5);
-  EXPECT_EQ(contents(dir / "wake_lock"), "atcid");
-  EXPECT_EQ(contents(dir / "wake_unlock"), "");
-  EXPECT_EQ(wake_lock_release_in(pattern, "atcid"), 5);
-  EXPECT_EQ(contents(dir / "wake_unlock"), "atcid");
-
-  fs::remove_all(dir);
-  EXPECT_EQ(wake_lock_acquire_in(pattern, PARTIAL_WAKE_LOCK, "atcid"), -ENOENT);
+TEST(PhoneWakeLock, ReachesTheLibraryAndAnswersZeroOrMinusOne) {
+  struct Row {
+    int library_result;
+    int expected;
+  };
+  for (const Row row : {Row{0, 0}, Row{5, 0}, Row{-1, -1}, Row{-EPERM, -1}}) {
+    g_result = row.library_result;
+    EXPECT_EQ(acquire_wake_lock(PARTIAL_WAKE_LOCK, "atcid"), row.expected);
+    EXPECT_EQ(g_call, "acquire 1 atcid");
+    EXPECT_EQ(release_wake_lock("atcid"), row.expected);
+    EXPECT_EQ(g_call, "release atcid");
+  }
 }
