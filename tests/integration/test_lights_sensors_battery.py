@@ -5,7 +5,7 @@ import time
 
 import pytest
 
-from conftest import BLOCK, TtyPhone, framed_tcp, framed_tty
+from conftest import BLOCK, PATIENCE, TtyPhone, framed_tcp, framed_tty
 
 import emulator
 
@@ -173,21 +173,41 @@ def test_sleep_in_console_mode_on_the_uart(device_root):
         phone.stop()
 
 
+def start_each(phone, kind, lines):
+    """Sends each start line once the previous one is answered OK. Stream output may come
+    before, after and, on TCP, between the answer's blocks."""
+    usb = kind == "usb"
+    data = b""
+    for line in lines:
+        phone.send(line + (b"\n" if usb else b""))
+        answer = framed_tty(line, b"", OK) if usb else framed_tcp(line, b"", OK)
+        pieces = [answer] if usb else [answer[i:i + BLOCK] for i in range(0, len(answer), BLOCK)]
+        deadline = time.monotonic() + PATIENCE
+        while not in_order(data, pieces) and time.monotonic() < deadline:
+            data += phone.station.read(65536) if usb else phone.receive(size=1, timeout=1)
+        assert in_order(data, pieces), line
+
+
+def in_order(data, pieces):
+    at = 0
+    for piece in pieces:
+        at = data.find(piece, at)
+        if at < 0:
+            return False
+        at += len(piece)
+    return True
+
+
 @pytest.mark.parametrize("kind", ["usb", "tcp"])
 def test_long_line_ends_the_daemon_while_workers_run(request, kind):
     phone = request.getfixturevalue(kind + "_phone")
-    for line in (b"AT+EDFT=6,1", b"AT+JVLIGHT=1", b"AT+EADC=1", b"AT+JVZLJC=0,1"):
-        phone.send(line + (b"\n" if kind == "usb" else b""))
-        time.sleep(0.05)
-    phone.receive(quiet=0.5, timeout=2)
+    start_each(phone, kind, (b"AT+EDFT=6,1", b"AT+JVLIGHT=1", b"AT+EADC=1", b"AT+JVZLJC=0,1"))
     phone.send(b"AT+NOTHERE=" + b"X" * 189 + (b"\n" if kind == "usb" else b""))
     assert phone.wait(timeout=20) == 0
 
 
 def test_lost_port_ends_the_daemon_while_streams_run(usb_phone):
-    for line in (b"AT+EADC=1", b"AT+JVZLJC=0,1", b"AT+EDFT=6,1"):
-        usb_phone.send(line + b"\n")
-        time.sleep(0.05)
+    start_each(usb_phone, "usb", (b"AT+EADC=1", b"AT+JVZLJC=0,1", b"AT+EDFT=6,1"))
     read_tty_until(usb_phone, lambda d: len(ADC_LINE.findall(d)) >= 2)
     usb_phone.bridge.hang_up()
     assert usb_phone.wait(timeout=20) == 1
