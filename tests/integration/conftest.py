@@ -43,6 +43,13 @@ NEEDS_RUNNING_SHELL = {
     "test_identity.py::test_key_generated_then_saved",
     "test_lifecycle.py::test_recovery_requests_answer_first",
     "test_lifecycle.py::test_root_integrity_check_runs_the_stand_in",
+    "test_lights_sensors_battery.py::test_template_phone",
+    "test_lights_sensors_battery.py::test_sleep_in_console_mode_on_the_uart",
+    "test_radio.py::test_wlan_rf_sequence",
+    "test_radio.py::test_bluetooth_address_and_dut",
+    "test_radio.py::test_fm",
+    "test_radio.py::test_slow_commands_started",
+    "test_radio.py::test_slow_commands_answers",
     "test_storage.py::test_shell_backed_checks",
     "test_storage.py::test_storage_calibration_through_vdc",
 }
