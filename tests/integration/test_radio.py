@@ -9,7 +9,7 @@ from pathlib import Path
 import pytest
 
 import emulator
-from conftest import BINARY, TcpPhone, framed_tty
+from conftest import BINARY, QEMU_USER, TcpPhone, framed_tty
 
 UNSHARE = shutil.which("unshare")
 
@@ -256,19 +256,22 @@ def test_slow_commands_answers(slow_commands):
     assert dw.answer == b"".join(
         b.ljust(2048, b"\0") for b in (b"AT+JVDW=1\r\n\n", b"\n", b"OK\r\n\n"))
     assert dw.elapsed >= 80
-    assert (dw.phone.root / ".emu/am.log").read_text().splitlines() == [
-        "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 3",
-        "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 4",
-        "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver -a kro.intent.action.DISCONNWIFI",
-    ]
+    if not QEMU_USER:  # am.log is the am stand-in's, run by the isolated shell (see conftest)
+        assert (dw.phone.root / ".emu/am.log").read_text().splitlines() == [
+            "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 3",
+            "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 4",
+            "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver"
+            " -a kro.intent.action.DISCONNWIFI",
+        ]
     wifi = slow_commands["wifi"]
     assert wifi.answer == b""  # the phone restarts without answering
     assert wifi.elapsed >= 50
     assert wifi.phone.wait(timeout=30) == 0
     assert (wifi.phone.root / ".emu/power.log").read_text() == "restart\n"
-    assert (wifi.phone.root / ".emu/am.log").read_text().splitlines() == [
-        "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver -a kro.intent.action.CONNWIFI"
-        " -e ssid LABNET -e pwd PW;1",  # the reader upper-cases the line
-        "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 3",
-        "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 4",
-    ]
+    if not QEMU_USER:  # as above
+        assert (wifi.phone.root / ".emu/am.log").read_text().splitlines() == [
+            "am broadcast -n com.ulda.engineermode/.ConnWifiReceiver -a kro.intent.action.CONNWIFI"
+            " -e ssid LABNET -e pwd PW;1",  # the reader upper-cases the line
+            "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 3",
+            "am broadcast -a kro.intent.action.KEEP_CREEN_ON -e status 4",
+        ]
