@@ -57,9 +57,12 @@ def figures(pid):
     return rss, len(os.listdir(f"/proc/{pid}/fd"))
 
 
-def sanitized(binary):
-    """True for a build with AddressSanitizer, whose quarantine and shadow make RSS meaningless."""
-    return b"__asan_init" in Path(binary).read_bytes()
+def rss_is_the_daemons(binary):
+    """False where resident memory says nothing of the daemon's own: a build with
+    AddressSanitizer (quarantine and shadow), or a script that starts it under an emulator
+    (qemu-user's translation cache grows as new code runs)."""
+    program = Path(binary).read_bytes()
+    return not program.startswith(b"#!") and b"__asan_init" not in program
 
 
 class PtyStation:
@@ -204,7 +207,7 @@ def compare(what, before, after, binary):
     problems = []
     if after[1] != before[1]:
         problems.append(f"{what}: {before[1]} open descriptors became {after[1]}")
-    if not sanitized(binary) and after[0] - before[0] > RSS_SLACK_KIB:
+    if rss_is_the_daemons(binary) and after[0] - before[0] > RSS_SLACK_KIB:
         problems.append(f"{what}: resident memory grew from {before[0]} to {after[0]} KiB")
     return problems
 
