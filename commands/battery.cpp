@@ -9,7 +9,7 @@
 
 #include "commands/command_util.h"
 #include "commands/worker.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/file_io.h"
@@ -62,7 +62,7 @@ bool write_adc_line() {
   const int n = std::snprintf(line, sizeof line, "+EADC: \"%.2f,%.2f,%.2f,%.2f,%.2f\"\r\n",
                               scaled(voltage, 1000000.0), scaled(temperature, 10.0), 0.584,
                               scaled(current, 1000.0), 4.5);
-  writeDataToSerial(line, std::min(n, static_cast<int>(sizeof line) - 1));
+  write_unsolicited({line, static_cast<size_t>(std::min(n, static_cast<int>(sizeof line) - 1))});
   return true;
 }
 

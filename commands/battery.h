@@ -5,7 +5,6 @@
 #include <pthread.h>
 
 // The ADC stream's handle: NO_THREAD when none is recorded. A stop forgets it at once.
-inline const pthread_t NO_THREAD = static_cast<pthread_t>(-1);
 extern std::atomic<pthread_t> adc_test_thread;
 extern std::atomic<bool> eadc_test_exit;
 

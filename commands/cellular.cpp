@@ -14,7 +14,7 @@
 #include "commands/radio_util.h"
 #include "core/command.h"
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"
@@ -59,17 +59,16 @@ int broadcast_switch(const Switch& s, const char* cmdline) {
   return RESULT_OK;
 }
 
-using IntRequest = int (*)(qmi::client_type*, qmi::txn_handle*, const kro_int_req_msg_v01*);
+using IntRequest = int (*)(qmi::client_type*, qmi::txn_handle*, const kro_int_req_msg_v01*,
+                          QmiResult*);
 
-// One 4-byte request and the reading of its results as one step. True when the request
-// returned 0 and its answer came without a transport error; `text` gets the answer text.
-bool int_request(IntRequest request, int32_t value, char (&text)[sizeof return_buffer]) {
-  std::lock_guard<std::recursive_mutex> step(qmi_request_lock);
+// One 4-byte request. True when it returned 0 and its answer came without a transport error;
+// `result` gets what the answer left.
+bool int_request(IntRequest request, int32_t value, QmiResult& result) {
   const kro_int_req_msg_v01 req{value};
-  const int rc = request(nullptr, nullptr, &req);
-  std::memcpy(text, return_buffer, sizeof text);
-  text[sizeof text - 1] = '\0';
-  return rc == 0 && qmi_flag == 0;
+  const int rc = request(nullptr, nullptr, &req, &result);
+  result.text[sizeof result.text - 1] = '\0';
+  return rc == 0 && result.flag == 0;
 }
 
 constexpr std::string_view kPresentSimStates[] = {
@@ -286,7 +285,7 @@ int set_sim2_status_handler(char* cmdline, int, char* response) {
       ATCI_LOGE("%s", s.failure);
       return RESULT_ERROR;
     }
-    char ignored[sizeof return_buffer];
+    QmiResult ignored;
     int_request(qmi_switch_sim2_status, s.value, ignored);
     return RESULT_OK;
   }
@@ -296,17 +295,17 @@ int set_sim2_status_handler(char* cmdline, int, char* response) {
 
 int primary_or_diversity_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
-  char text[sizeof return_buffer];
+  QmiResult answer;
   if (line_starts_with(cmdline, "AT+JVZFTX=1")) {
     CommaFields fields(cmdline);
     const std::string_view n = fields.next();
     if (n.empty()) return RESULT_ERROR;
     return result_of(int_request(mutuallySwitchForPrimaryAndDiversity,
-                                 static_cast<int32_t>(parse_long(n)), text));
+                                 static_cast<int32_t>(parse_long(n)), answer));
   }
   if (line_is(cmdline, "AT+JVZFTX=0")) {
-    if (!int_request(getPrimaryAndDiversitymsg, 1, text)) return RESULT_ERROR;
-    std::snprintf(response, RESPONSE_SIZE, "%s", text);
+    if (!int_request(getPrimaryAndDiversitymsg, 1, answer)) return RESULT_ERROR;
+    std::snprintf(response, RESPONSE_SIZE, "%s", answer.text);
     return RESULT_OK;
   }
   return REJECT_COMMAND_LINE(cmdline);
@@ -344,8 +343,8 @@ int virtual_sim_handler(char* cmdline, int, char* response) {
     property_set("persist.radio.multisim.config", "");
     property_set("persist.sys.tel.autoanswer.ms", "5");
   }
-  char text[sizeof return_buffer];
-  if (!int_request(qmi_set_status, v->code, text)) {
+  QmiResult answer;
+  if (!int_request(qmi_set_status, v->code, answer)) {
     ATCI_LOGE("======send qmi msg fail\n");
     return RESULT_ERROR;
   }
@@ -353,7 +352,7 @@ int virtual_sim_handler(char* cmdline, int, char* response) {
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db");
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db-journal");
   }
-  if (v->code == 15) std::snprintf(response, RESPONSE_SIZE, "\r\n%s\r\n", text);
+  if (v->code == 15) std::snprintf(response, RESPONSE_SIZE, "\r\n%s\r\n", answer.text);
   return RESULT_OK;
 }
 
@@ -377,8 +376,9 @@ int set_dpdt_status_handler(char* cmdline, int, char* response) {
   }
   for (const Dpdt& v : kVariants) {
     if (!line_is(cmdline, v.line)) continue;
-    char text[sizeof return_buffer];
-    const bool answered = int_request(qmi_set_status, v.code, text);
+    QmiResult answer;
+    const char* const text = answer.text;
+    const bool answered = int_request(qmi_set_status, v.code, answer);
     ATCI_LOGD("return_buffer: %s\r\n", text);
     if (!answered) return RESULT_ERROR;
     switch (v.answer) {

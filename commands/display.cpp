@@ -10,7 +10,7 @@
 #include <unistd.h>
 
 #include "commands/command_util.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"
@@ -67,8 +67,7 @@ int set_colour_type(const char* cmdline) {
 
 // The unit goes to sleep: the answer leaves first, since the port goes quiet after it.
 int sleep_now(int fb) {
-  static constexpr char kAnswer[] = "AT+EQSB=0\r\n\r\nOK\r\n";
-  writeDataToSerial(kAnswer, sizeof kAnswer - 1);
+  write_early_answer("AT+EQSB=0", "OK", true);
   run_shell("/system/bin/sh -c \"echo \"255\" > /sys/class/leds/lcd-backlight/brightness\"");
   run_shell("/system/bin/sh -c \"echo \"0\" > /sys/class/leds/lcd-backlight/brightness\"");
   run_shell("/system/bin/sh -c \"echo 1 > /sys/touchscreen/suspend_cmd\"");

@@ -9,6 +9,7 @@
 
 #include "commands/command_util.h"
 #include "commands/usb_adb.h"
+#include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -72,15 +73,17 @@ bool boot_completed() {
   return strcasecmp(bootanim, "stopped") == 0 && strcasecmp(completed, "1") == 0;
 }
 
-void* root_integrity_check_thread(void*) {
-  ATCI_LOGD("%s: Start", __func__);
-  dev_unlink("/data/rooIntegityCheck.txt");
-  int ret = run_shell("/system/bin/sh -c \"richk > data/rooIntegityCheck.txt\"");
-  ATCI_LOGD("ret%d", ret);
-  ret = run_shell("/system/bin/sh -c \"chmod 666 /data/rooIntegityCheck.txt\"");
-  ATCI_LOGD("ret%d", ret);
+void root_integrity_check_thread() {
+  {
+    const WorkerCycle cycle;
+    ATCI_LOGD("%s: Start", __func__);
+    dev_unlink("/data/rooIntegityCheck.txt");
+    int ret = run_shell("/system/bin/sh -c \"richk > data/rooIntegityCheck.txt\"");
+    ATCI_LOGD("ret%d", ret);
+    ret = run_shell("/system/bin/sh -c \"chmod 666 /data/rooIntegityCheck.txt\"");
+    ATCI_LOGD("ret%d", ret);
+  }
   root_integrity_check_running.store(false, std::memory_order_release);
-  return nullptr;
 }
 
 // Sets the log switch and checks that it took.
@@ -201,8 +204,7 @@ int jvkj_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVKJ=1")) return RESULT_ERROR;
   bool idle = false;
   if (!root_integrity_check_running.compare_exchange_strong(idle, true)) return RESULT_OK;
-  if (start_detached_thread(root_integrity_check_thread)) return RESULT_OK;
-  ATCI_LOGE("cannot start the root integrity check");
+  if (start_worker(nullptr, root_integrity_check_thread, true) == 0) return RESULT_OK;
   root_integrity_check_running.store(false);
   return RESULT_ERROR;
 }
@@ -228,9 +230,10 @@ int jvlog_handler(char* cmdline, int, char*) {
 int jvefs_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVEFS=1")) return RESULT_ERROR;
   const kro_int_req_msg_v01 request{0};
-  if (qmi_efs_golden_copy(nullptr, nullptr, &request) != 0) return RESULT_ERROR;
-  ATCI_LOGD("return_buffer: %s", return_buffer);
-  return result_of(std::string_view(return_buffer) == "0");
+  QmiResult result;
+  if (qmi_efs_golden_copy(nullptr, nullptr, &request, &result) != 0) return RESULT_ERROR;
+  ATCI_LOGD("return_buffer: %s", result.text);
+  return result_of(std::string_view(result.text) == "0");
 }
 
 int jvrdnv_handler(char* cmdline, int, char* response) {

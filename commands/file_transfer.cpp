@@ -17,7 +17,7 @@
 #include "commands/command_util.h"
 #include "core/command.h"
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"
@@ -99,21 +99,19 @@ struct StreamDecoder {
 // Reads the content into `fd` until `remaining` bytes arrived (more are kept, as stations
 // have always seen). False when the port fails or a write is short.
 bool receive_content(int fd, long long remaining) {
-  const bool stream = is_socket_transport() && is_uart_flag != 1;
   StreamDecoder decoder;
   char chunk[kChunkChars + 1];
   uint8_t bytes[kChunkBytes];
   while (remaining > 0) {
-    int count = readDataFromSerial(chunk, kChunkChars);
-    ATCI_LOGD("receive_len=%d", count);
-    // The socket's count runs one past the characters received; none means the peer left.
-    if (stream) --count;
+    const PortRead read = read_port_data(chunk, kChunkChars);
+    ATCI_LOGD("receive_len=%d", read.count);
+    const int count = read.bytes;
     if (count < 1) {
       ATCI_LOGE("write file error:%s ", std::strerror(errno));
       return false;
     }
     size_t n;
-    if (stream) {
+    if (read.stream) {
       n = decoder.decode(chunk, count, bytes);
     } else if (count == 1) {
       ATCI_LOGD("readDataFromSerial: %0x, %s", chunk[0], "drop");

@@ -1,7 +1,6 @@
 #include "commands/gps_fm.h"
 
 #include <fcntl.h>
-#include <pthread.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -12,9 +11,10 @@
 
 #include "commands/battery.h"
 #include "commands/command_util.h"
+#include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"
@@ -31,8 +31,10 @@ bool gps_open = false;
 std::atomic<bool> gps_thread_exit{true};
 // Only the reader thread starts, stops and joins the worker.
 pthread_t gps_thread = NO_THREAD;
-// Cuts the worker's 300 ms pause short when it is told to stop.
-std::mutex gps_pause_lock;
+// Held by the worker across its look at the stop flag and its request, and by the close
+// across its request and the stop: no poll request follows the close. Its pause waits on it,
+// so a stop cuts the 300 ms short.
+std::mutex gps_poll_lock;
 std::condition_variable gps_pause;
 
 int fm_tuner_fd = -1;
@@ -44,13 +46,6 @@ int gps_option(uint8_t option) {
 
 bool gps_thread_set() { return !pthread_equal(gps_thread, NO_THREAD); }
 
-void tell_gps_worker_to_stop() {
-  {
-    std::lock_guard<std::mutex> held(gps_pause_lock);
-    gps_thread_exit = true;
-  }
-  gps_pause.notify_all();
-}
 
 int gps_open_handler(uint8_t option) {
   if (is_sp == 0) {
@@ -74,15 +69,15 @@ int gps_open_handler(uint8_t option) {
 int gps_close_handler() {
   ATCI_LOGD("========gps first close\n");
   {
-    // No poll request may follow the close: the worker looks at its flag under this lock.
-    std::lock_guard<std::recursive_mutex> step(qmi_request_lock);
+    const std::lock_guard step(gps_poll_lock);
     if (gps_option(0) != 0) {
       ATCI_LOGE("======send qmi msg fail\n");
       return RESULT_ERROR;
     }
     gps_open = false;
-    tell_gps_worker_to_stop();
+    gps_thread_exit = true;
   }
+  gps_pause.notify_all();
   // Reaped here, so a following =2 can never run beside it.
   if (gps_thread_set()) pthread_join(gps_thread, nullptr);
   gps_thread = NO_THREAD;
@@ -93,7 +88,7 @@ int gps_stream_handler() {
   gps_thread_exit = false;
   if (gps_thread_set()) return RESULT_OK;
   pthread_t thread;
-  const int rc = pthread_create(&thread, nullptr, update_gps_value_thread, nullptr);
+  const int rc = start_worker(&thread, update_gps_value_thread, false);
   if (rc != 0) {
     ATCI_LOGE("fail to create adc_test_thread errno:%d", rc);
     // Whether the battery stream runs decides, as it always has.
@@ -128,27 +123,26 @@ bool headset_plugged() {
 
 }  // namespace
 
-void* update_gps_value_thread(void*) {
+void update_gps_value_thread() {
   const int running = gps_workers_running.fetch_add(1) + 1;
   int peak = gps_workers_peak.load();
   while (running > peak && !gps_workers_peak.compare_exchange_weak(peak, running)) {
   }
-  for (;;) {
+  std::unique_lock held(gps_poll_lock);
+  while (!gps_thread_exit) {
     {
-      std::lock_guard<std::recursive_mutex> step(qmi_request_lock);
-      if (gps_thread_exit) break;
+      const WorkerCycle cycle;
       if (gps_option(2) != 0) {
         ATCI_LOGE("======send qmi msg fail\n");
         break;
       }
     }
-    std::unique_lock<std::mutex> held(gps_pause_lock);
     if (gps_pause.wait_for(held, std::chrono::milliseconds(300),
                            [] { return gps_thread_exit.load(); }))
       break;
   }
+  held.unlock();
   gps_workers_running.fetch_sub(1);
-  return nullptr;
 }
 
 int gps_handler(char* cmdline, int, char*) {

@@ -23,8 +23,8 @@ constexpr uint32_t kBarcodeItem = 6853;
 constexpr uint32_t kImeiItem = 550;
 
 // A request that could not be sent or whose answer carried a transport error.
-bool modem_request_failed(int ret) {
-  if (ret == 0 && qmi_flag == 0) return false;
+bool modem_request_failed(int ret, const QmiResult& result) {
+  if (ret == 0 && result.flag == 0) return false;
   ATCI_LOGE("======send qmi msg fail\n");
   return true;
 }
@@ -35,12 +35,13 @@ int read_nv_item(uint32_t item, uint8_t option, char* response) {
   kro_read_nv_info_req_msg_v01 req{};
   req.nvItem_id = item;
   req.option[0] = req.option[1] = option;
-  std::memset(oem_buf, 0, sizeof oem_buf);
   qmi::client_type clnt{};
   qmi::txn_handle txn{};
-  if (modem_request_failed(qmi_kro_read_nv_msg(&clnt, &txn, &req))) return RESULT_ERROR;
-  std::snprintf(response, RESPONSE_SIZE, "%.*s", static_cast<int>(sizeof return_buffer),
-                return_buffer);
+  QmiResult result;
+  if (modem_request_failed(qmi_kro_read_nv_msg(&clnt, &txn, &req, &result), result))
+    return RESULT_ERROR;
+  std::snprintf(response, RESPONSE_SIZE, "%.*s", static_cast<int>(sizeof result.text),
+                result.text);
   return RESULT_OK;
 }
 
@@ -56,7 +57,9 @@ int write_nv_item(uint32_t item, uint8_t option, const char* value, const char* 
             request_name, static_cast<int>(sizeof req.buffer), req.buffer);
   qmi::client_type clnt{};
   qmi::txn_handle txn{};
-  if (modem_request_failed(qmi_kro_write_nv_msg(&clnt, &txn, &req))) return RESULT_ERROR;
+  QmiResult result;
+  if (modem_request_failed(qmi_kro_write_nv_msg(&clnt, &txn, &req, &result), result))
+    return RESULT_ERROR;
   ATCI_LOGD("=======111stop\n");
   return RESULT_OK;
 }

@@ -12,7 +12,7 @@
 #include "commands/command_util.h"
 #include "commands/device_info.h"
 #include "commands/worker.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"

@@ -12,7 +12,7 @@
 #include "commands/storage.h"
 #include "core/command.h"
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "minzip/app_version.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
@@ -31,17 +31,9 @@ constexpr size_t kRecoveryTextMax = 255;
 
 void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
 
-// The phone is about to go away: the station hears OK now or never.
-void early_answer(const char* text) {
-  writeDataToSerial(text, static_cast<int>(std::strlen(text)));
-}
-
-// "%s\r\n\r\nOK\r\n" with the line, as the update commands answer before recovery.
-void early_answer_line(const char* cmdline) {
-  char text[CMD_LINE_SIZE + 16];
-  std::snprintf(text, sizeof text, "%s\r\n\r\nOK\r\n", cmdline);
-  early_answer(text);
-}
+// The phone is about to go away: the station hears OK now or never. The update commands
+// answer with a blank line before the word, the power commands without.
+void early_answer_line(const char* cmdline) { write_early_answer(cmdline, "OK", true); }
 
 void ensure_recovery_dir() {
   if (dev_access(kRecoveryDir, F_OK) != 0) run_shell("/system/bin/sh -c \"mkdir /cache/recovery\"");
@@ -91,7 +83,7 @@ int master_clear() {
     return true;
   });
   if (status != RESULT_OK) return status;
-  early_answer("AT+JVRT=1\r\nOK\r\n");
+  write_early_answer("AT+JVRT=1", "OK");
   sleep_ms(3000);
   reboot_recovery();
   return RESULT_OK;
@@ -228,7 +220,7 @@ int set_restore_flag() {
 int jvgj_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVGJ=0")) return RESULT_ERROR;
   platform_sync();
-  early_answer("AT+JVGJ=0\r\nOK\r\n");
+  write_early_answer("AT+JVGJ=0", "OK");
   ATCI_LOGD("sync emmc flash complete! shutdown now.");
   sleep_ms(100);
   platform_power_off();
@@ -238,7 +230,7 @@ int jvreboot_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVREBOOT=1")) return REJECT_COMMAND_LINE(cmdline);
   platform_sync();
   ATCI_LOGD("sync emmc flash complete! shutdown now.");
-  early_answer("AT+JVREBOOT=1\r\nOK\r\n");
+  write_early_answer("AT+JVREBOOT=1", "OK");
   sleep_ms(150);
   platform_restart();
 }

@@ -8,7 +8,7 @@
 
 #include "commands/command_util.h"
 #include "commands/worker.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/device_services.h"
 #include "platform/platform.h"
 #include "services/ulda_nvram.h"
@@ -60,7 +60,7 @@ bool write_z_line() {
   if (!run_sensor_test(49, result)) return false;
   char line[10];
   const int n = std::snprintf(line, sizeof line, "\r\n%.f", value(result, 3));
-  writeDataToSerial(line, std::min(n, static_cast<int>(sizeof line) - 1));
+  write_unsolicited({line, static_cast<size_t>(std::min(n, static_cast<int>(sizeof line) - 1))});
   return true;
 }
 

@@ -10,15 +10,14 @@
 #include <memory>
 
 #include "commands/command_util.h"
+#include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 #include "services/factory_support.h"
 #include "services/ulda_nvram.h"
-
-std::atomic<int> usb_watch_count{0};
 
 namespace {
 
@@ -27,40 +26,35 @@ constexpr const char* kDebugUsbFunctions = "diag,serial_smd,serial_tty,rmnet_bam
 constexpr const char* kUsbOnline = "/sys/class/power_supply/usb/online";
 constexpr size_t kScratchSize = 2 * 1024 * 1024;
 
-// The handle of the last cable watch started.
-pthread_t usb_watch_thread;
-
 void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
 
-void* check_usb_state_thread(void*) {
-  ATCI_LOGD("%s: Start", __func__);
-  for (;;) {
-    UniqueFd online(dev_open(kUsbOnline, O_RDONLY));
-    if (!online.ok()) {
-      ATCI_LOGE("fail to open online");
-      sleep_ms(1000);
-      continue;
-    }
-    char state[6] = {};
-    if (::read(online.get(), state, 5) < 0) {
-      // A node that keeps failing must not make the watch spin.
-      ATCI_LOGE("fail to read online");
-      online.reset();
-      sleep_ms(1000);
-      continue;
-    }
-    ATCI_LOGD("usb online =%s", state);
-    if (state[0] == '0') {
-      ATCI_LOGD("power off");
-      online.reset();
-      sendBroadcastFromAtcid(nullptr, "kro.intent.action.AT_SHUT_DOWN", nullptr);
-      ATCI_LOGD("========%s: Exit", __func__);
-      usb_watch_count.fetch_sub(1, std::memory_order_release);
-      return nullptr;
-    }
-    online.reset();
-    sleep_ms(2000);
+// One look at the cable: the pause before the next look in milliseconds, or 0 once it was
+// pulled and the phone told to shut down. A node that cannot be read is looked at again after
+// a second, so it never makes the watch spin.
+unsigned look_at_usb_cable() {
+  const WorkerCycle cycle;
+  UniqueFd online(dev_open(kUsbOnline, O_RDONLY));
+  if (!online.ok()) {
+    ATCI_LOGE("fail to open online");
+    return 1000;
   }
+  char state[6] = {};
+  if (::read(online.get(), state, 5) < 0) {
+    ATCI_LOGE("fail to read online");
+    return 1000;
+  }
+  ATCI_LOGD("usb online =%s", state);
+  if (state[0] != '0') return 2000;
+  ATCI_LOGD("power off");
+  online.reset();
+  sendBroadcastFromAtcid(nullptr, "kro.intent.action.AT_SHUT_DOWN", nullptr);
+  return 0;
+}
+
+void check_usb_state_thread() {
+  ATCI_LOGD("%s: Start", __func__);
+  while (const unsigned pause = look_at_usb_cable()) sleep_ms(pause);
+  ATCI_LOGD("========%s: Exit", __func__);
 }
 
 int open_debug_access() {
@@ -81,17 +75,6 @@ int open_debug_access() {
 }
 
 }  // namespace
-
-bool start_detached_thread(void* (*routine)(void*), pthread_t* handle) {
-  pthread_attr_t attr;
-  if (pthread_attr_init(&attr) != 0) return false;
-  pthread_attr_setdetachstate(&attr, PTHREAD_CREATE_DETACHED);
-  pthread_t thread;
-  const bool started = pthread_create(&thread, &attr, routine, nullptr) == 0;
-  pthread_attr_destroy(&attr);
-  if (started && handle != nullptr) *handle = thread;
-  return started;
-}
 
 int write_file_to_data() {
   UniqueFd file(dev_open("/data/at_test", O_WRONLY | O_CREAT | O_TRUNC, 0666));
@@ -130,9 +113,7 @@ int close_adb(const char* cmdline) {
 
   // Switching to charging removes the USB serial function and the port with it: the station
   // hears OK now or never.
-  char early[CMD_LINE_SIZE + 16];
-  const int length = std::snprintf(early, sizeof early, "%s\r\nOK\r\n", cmdline);
-  if (is_uart_flag == 0) writeDataToSerial(early, length);
+  if (is_uart_flag == 0) write_early_answer(cmdline, "OK");
 
   property_set(kUsbConfig, "charging");
   ATCI_LOGD("close wifi");
@@ -176,11 +157,7 @@ int jvadb_handler(char* cmdline, int, char* response) {
   }
   if (line_is(line, "AT+JVADB=0,3")) {
     if (close_adb(line) != 1) return RESULT_ERROR;
-    usb_watch_count.fetch_add(1);
-    if (start_detached_thread(check_usb_state_thread, &usb_watch_thread)) return RESULT_OK;
-    usb_watch_count.fetch_sub(1);
-    ATCI_LOGE("cannot start the usb watch");
-    return RESULT_ERROR;
+    return result_of(start_worker(nullptr, check_usb_state_thread, true) == 0);
   }
   return REJECT_COMMAND_LINE(line);
 }

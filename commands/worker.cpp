@@ -47,7 +47,7 @@ int start_worker(pthread_t* handle, void (*body)(), bool detached) {
     ATCI_LOGE("pthread_create failed: %d", error);
     return error;
   }
-  *handle = thread;
+  if (handle != nullptr) *handle = thread;
   return 0;
 }
 

@@ -1,11 +1,15 @@
-// Worker threads of the command families: plain pthreads stopped through global flags.
+// Worker threads of the command families: plain pthreads stopped through global flags. Every
+// thread a handler starts starts here, so each one is counted and held by the exit guard.
 #pragma once
 
 #include <atomic>
 #include <pthread.h>
 
-// Starts `body` on a new thread, joinable or detached. 0, or the pthread error; `handle` is
-// set only on success.
+// A handle that names no thread.
+inline const pthread_t NO_THREAD = static_cast<pthread_t>(-1);
+
+// Starts `body` on a new thread, joinable or detached. 0, or the pthread error (logged); the
+// handle goes to `handle` (may be null) only on success.
 int start_worker(pthread_t* handle, void (*body)(), bool detached);
 
 // The body of a stream: one cycle per period while `exit` is false (tested before the first

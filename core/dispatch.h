@@ -7,4 +7,3 @@ int process_cmd_line(char* line);
 int pemu_command_hdlr(char* line);
 // The form bit of a line (OP_INVALID … OP_ACTION).
 int classify_command_form(const char* line);
-void writeDataToserialByResponseType(const char* echo, const char* body, int status);

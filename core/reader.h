@@ -1,7 +1,7 @@
 // The daemon's only loop: one read is one command line.
 #pragma once
 
-#include "core/serial.h"
+#include "core/transport.h"
 
 // Waits for one read that begins with "AT" (any case); returns the line or null.
 char* readline(SerialDevice* device);

@@ -13,7 +13,7 @@
 
 #include "core/log.h"
 #include "core/reader.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
 
@@ -72,7 +72,7 @@ int serve_uart() {
 }
 
 int serve_socket() {
-  std::strcpy(serial.dev_name[0], "socket");
+  attach_port(PortKind::socket, -1);
   // One station connection per run: when it ends, so does the daemon, and init starts it again.
   const int listener = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
   if (listener < 0) fail_socket("Failed to create socket!!!\n");
@@ -86,7 +86,7 @@ int serve_socket() {
     fail_socket("Bind socket error!!!\n");
   if (::listen(listener, kListenBacklog) != 0) fail_socket("Listen socket error!!!\n");
   ATCI_LOGI("start accept\n");
-  serial.fd[0] = ::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC);
+  attach_port(PortKind::socket, ::accept4(listener, nullptr, nullptr, SOCK_CLOEXEC));
   // Never accepted on again: a station that calls meanwhile is refused at once, rather than
   // left waiting in the queue of a daemon that will not answer it.
   ::close(listener);

@@ -9,18 +9,23 @@
 #include <mutex>
 
 #include "core/log.h"
-#include "core/serial.h"
+#include "core/transport.h"
 
+// The results of the last fixed-message response, written by the callback on the transport's
+// thread. Only the requests read them, into their caller's QmiResult.
 int32_t qmi_flag = 0;
 char return_buffer[1024];
 int32_t oem_buf[32];
 std::atomic<int32_t> qmi_pending{0};
-// Both the GPS poll thread and handlers send fixed messages; they share the globals.
-std::recursive_mutex qmi_request_lock;
 
-static_assert(sizeof return_buffer == 1024 && sizeof oem_buf == 128);
+static_assert(sizeof return_buffer == sizeof QmiResult{}.text &&
+              sizeof oem_buf == sizeof QmiResult{}.oem && sizeof oem_buf == 128);
 
 namespace {
+
+// One fixed-message request at a time, from its send to the copy of its results: handlers and
+// the GPS poll thread share the globals above.
+std::mutex qmi_request_lock;
 
 // Logs under the name of the request being served, as each request function would.
 #define QMI_LOG(level, func, fmt, ...) \
@@ -66,8 +71,9 @@ constexpr unsigned kMaxServiceEntries = 8;
 
 unsigned as_hex(const void* p) { return static_cast<unsigned>(reinterpret_cast<uintptr_t>(p)); }
 
-int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* txn,
-               const void* req) {
+// Runs under the request lock.
+int send_fixed_locked(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* txn,
+                      const void* req) {
   qmi::client_type local_clnt = nullptr;
   qmi::txn_handle local_txn = 0;
   if (clnt == nullptr) clnt = &local_clnt;
@@ -75,7 +81,6 @@ int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* t
   const QmiMessageSizes sizes = qmi_kro_sizes_of(m.id);
   alignas(8) unsigned char resp[kMaxResponse] = {};
 
-  std::lock_guard<std::recursive_mutex> one_at_a_time(qmi_request_lock);
   if (qmi_kro_clnt_init(clnt) != 0) {
     QMI_LOG(LOG_LVL_ERR, m.name, "qmi_kro_clnt_init() fail");
     return -1;
@@ -105,6 +110,18 @@ int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* t
   if (m.logs_release)
     QMI_LOG(LOG_LVL_DEBUG, m.name, "KRO: qmi_client_release of clnt returned %d\n", released);
   return 0;
+}
+
+int send_fixed(const FixedMessage& m, qmi::client_type* clnt, qmi::txn_handle* txn,
+               const void* req, QmiResult* result) {
+  const std::lock_guard one_at_a_time(qmi_request_lock);
+  const int rc = send_fixed_locked(m, clnt, txn, req);
+  if (result != nullptr) {
+    result->flag = qmi_flag;
+    std::memcpy(result->text, return_buffer, sizeof result->text);
+    std::memcpy(result->oem, oem_buf, sizeof result->oem);
+  }
+  return rc;
 }
 
 int send_and_wait(const char* func, void* req, unsigned req_len, unsigned msg_id, void* resp,
@@ -198,35 +215,43 @@ int qmi_kro_clnt_init(qmi::client_type* clnt) {
 }
 
 int qmi_kro_read_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                        const kro_read_nv_info_req_msg_v01* req) {
-  return send_fixed(kReadNv, clnt, txn, req);
+                        const kro_read_nv_info_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kReadNv, clnt, txn, req, result);
 }
 int qmi_kro_write_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                         const kro_write_nv_info_req_msg_v01* req) {
-  return send_fixed(kWriteNv, clnt, txn, req);
+                         const kro_write_nv_info_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kWriteNv, clnt, txn, req, result);
 }
 int qmi_kro_gps_option_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                           const kro_gps_option_req_msg_v01* req) {
-  return send_fixed(kGpsOption, clnt, txn, req);
+                           const kro_gps_option_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kGpsOption, clnt, txn, req, result);
 }
 int mutuallySwitchForPrimaryAndDiversity(qmi::client_type* clnt, qmi::txn_handle* txn,
-                                         const kro_int_req_msg_v01* req) {
-  return send_fixed(kSetAntenna, clnt, txn, req);
+                                         const kro_int_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kSetAntenna, clnt, txn, req, result);
 }
 int getPrimaryAndDiversitymsg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                              const kro_int_req_msg_v01* req) {
-  return send_fixed(kGetAntenna, clnt, txn, req);
+                              const kro_int_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kGetAntenna, clnt, txn, req, result);
 }
-int qmi_set_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req) {
-  return send_fixed(kSetStatus, clnt, txn, req);
+int qmi_set_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kSetStatus, clnt, txn, req, result);
 }
 int qmi_switch_sim2_status(qmi::client_type* clnt, qmi::txn_handle* txn,
-                           const kro_int_req_msg_v01* req) {
-  return send_fixed(kSim2, clnt, txn, req);
+                           const kro_int_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kSim2, clnt, txn, req, result);
 }
 int qmi_efs_golden_copy(qmi::client_type* clnt, qmi::txn_handle* txn,
-                        const kro_int_req_msg_v01* req) {
-  return send_fixed(kEfs, clnt, txn, req);
+                        const kro_int_req_msg_v01* req,
+                 QmiResult* result) {
+  return send_fixed(kEfs, clnt, txn, req, result);
 }
 
 int qmi_kro_read_nv_msg_ex(void* req, unsigned req_len, unsigned msg_id, void* resp,
@@ -264,7 +289,7 @@ void kro_rx_cb(qmi::client_type, unsigned msg_id, void* resp, unsigned resp_len,
       ATCI_LOGD("=====QMI_KRO_GPS_OPTION_INFO_RESP_MSG_V01 \n");
       if (const auto* r = response_as<kro_gps_option_resp_msg_v01>(resp, resp_len);
           r && r->buffer_valid != 0)
-        writeDataToSerial(r->buffer, static_cast<int>(strnlen(r->buffer, sizeof r->buffer)));
+        write_unsolicited({r->buffer, strnlen(r->buffer, sizeof r->buffer)});
       break;
     case QMI_KRO_SET_FORMAT_RESP_MSG_V01:
       ATCI_LOGD("====set_format \n");

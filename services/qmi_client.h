@@ -7,21 +7,22 @@
 
 #include <atomic>
 #include <cstdint>
-#include <mutex>
 
+#include "platform/qmi_messages.h"
 #include "platform/qmi_transport.h"
-#include "services/qmi_messages.h"
 
-// Results of the last fixed-message response. Read them only after the request returned.
-extern int32_t qmi_flag;                  // its transport error
-extern char return_buffer[1024];          // its text, cleared by every response
-extern int32_t oem_buf[32];               // OEM block of the last NV read that carried one
-extern std::atomic<int32_t> qmi_pending;  // requests sent and not yet answered
+// What a fixed-message request's response left in the client's result globals (`qmi_flag`,
+// `return_buffer`, `oem_buf`), copied by the request itself while no other request can run:
+// another thread's answer (the GPS poll's) never lands between a request and its reading.
+// A request that could not be sent copies what the last response left.
+struct QmiResult {
+  int32_t flag;     // the transport error
+  char text[1024];  // the text, cleared by every response
+  int32_t oem[32];  // the OEM block of the last NV read that carried one
+};
 
-// One fixed-message request at a time. A caller that reads the results above holds it across
-// its request and the reading, so no other thread's request (the GPS poll) lands in between;
-// the requests take it again themselves.
-extern std::recursive_mutex qmi_request_lock;
+// Fixed-message requests sent and not yet answered.
+extern std::atomic<int32_t> qmi_pending;
 
 // The semaphore variants' wait record.
 struct qmi_kro_wait_record {
@@ -34,23 +35,26 @@ struct qmi_kro_wait_record {
 // Blocks for good while the service is not up.
 int qmi_kro_clnt_init(qmi::client_type* clnt);
 
-// Fixed-message requests: 0 once the answer arrived, -1 when it could not be sent.
+// Fixed-message requests, one at a time: 0 once the answer arrived, -1 when it could not be
+// sent. `result`, when given, gets what the answer left.
 int qmi_kro_read_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                        const kro_read_nv_info_req_msg_v01* req);
+                        const kro_read_nv_info_req_msg_v01* req, QmiResult* result = nullptr);
 int qmi_kro_write_nv_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                         const kro_write_nv_info_req_msg_v01* req);
+                         const kro_write_nv_info_req_msg_v01* req, QmiResult* result = nullptr);
 // A valid answer goes straight to the port.
 int qmi_kro_gps_option_msg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                           const kro_gps_option_req_msg_v01* req);
+                           const kro_gps_option_req_msg_v01* req, QmiResult* result = nullptr);
 int mutuallySwitchForPrimaryAndDiversity(qmi::client_type* clnt, qmi::txn_handle* txn,
-                                         const kro_int_req_msg_v01* req);
+                                         const kro_int_req_msg_v01* req,
+                                         QmiResult* result = nullptr);
 int getPrimaryAndDiversitymsg(qmi::client_type* clnt, qmi::txn_handle* txn,
-                              const kro_int_req_msg_v01* req);
-int qmi_set_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req);
+                              const kro_int_req_msg_v01* req, QmiResult* result = nullptr);
+int qmi_set_status(qmi::client_type* clnt, qmi::txn_handle* txn, const kro_int_req_msg_v01* req,
+                   QmiResult* result = nullptr);
 int qmi_switch_sim2_status(qmi::client_type* clnt, qmi::txn_handle* txn,
-                           const kro_int_req_msg_v01* req);
+                           const kro_int_req_msg_v01* req, QmiResult* result = nullptr);
 int qmi_efs_golden_copy(qmi::client_type* clnt, qmi::txn_handle* txn,
-                        const kro_int_req_msg_v01* req);
+                        const kro_int_req_msg_v01* req, QmiResult* result = nullptr);
 
 // Semaphore variants for any thread: the answer lands in the caller's `resp`, its transport
 // error and message id in `wait`. 0 on success (also when no semaphore could be made), -1

@@ -23,7 +23,7 @@
 #include "platform/host/host_root.h"
 #include "platform/platform.h"
 #include "platform/qmi_transport.h"
-#include "services/qmi_messages.h"
+#include "platform/qmi_messages.h"
 
 namespace {
 

@@ -11,45 +11,24 @@
 #include "core/command.h"
 #include "core/dispatch.h"
 #include "core/reader.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "core/startup.h"
 #include "tests/unit/device_root.h"
+#include "tests/unit/station_port.h"
 
 namespace {
 
-// Puts the transport on one end of a socket pair (socket mode) or of a pipe (tty mode) and
-// hands the test the other end.
 class TransportTest : public DeviceRootTest {
  protected:
   void TearDown() override {
-    for (int fd : {station_, serial.fd[0]})
-      if (fd >= 0) ::close(fd);
-    initSerialDevice(&serial);
+    port_.close();
     DeviceRootTest::TearDown();
   }
+  void use_socket() { port_.open(PortKind::socket); }
+  void use_tty() { port_.open(PortKind::tty); }
+  std::string drain() { return port_.drain(); }
 
-  // Sequenced packets keep each write one read, as a station's sends and a canonical tty's
-  // lines arrive in practice.
-  void use_transport(const char* device_name) {
-    int pair[2];
-    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, pair), 0);
-    initSerialDevice(&serial);
-    std::strcpy(serial.dev_name[0], device_name);
-    serial.fd[0] = pair[0];
-    station_ = pair[1];
-  }
-  void use_socket() { use_transport("socket"); }
-  void use_tty() { use_transport("/dev/ttyGS0"); }
-
-  std::string drain() {
-    std::string out;
-    char buf[8192];
-    ::fcntl(station_, F_SETFL, O_NONBLOCK);
-    for (ssize_t n; (n = ::read(station_, buf, sizeof buf)) > 0;) out.append(buf, n);
-    return out;
-  }
-
-  int station_ = -1;
+  StationPort port_;
 };
 
 std::string block(std::string_view text) {
@@ -140,10 +119,10 @@ TEST_F(TransportTest, DispatcherAnswersKnownNamesOnly) {
 
 TEST_F(TransportTest, SocketReadCountsOneMore) {
   use_socket();
-  ASSERT_EQ(::write(station_, "12345", 5), 5);
+  port_.send("12345");
   char buf[64];
   EXPECT_EQ(readDataFromSerial(buf, sizeof buf), 6);
-  ::shutdown(station_, SHUT_WR);
+  port_.hang_up();
   EXPECT_EQ(readDataFromSerial(buf, sizeof buf), 1);
 }
 
@@ -151,7 +130,7 @@ TEST_F(TransportTest, ReaderTakesOnlyReadsThatBeginWithAT) {
   use_tty();
   // Each datagram is one read, as a canonical tty delivers one line per read.
   for (const char* read : {"A\n", "T+JVCN\n", " AT+JVCN\n", "at+jvcn\n"})
-    ASSERT_GT(::write(station_, read, std::strlen(read)), 0);
+    port_.send(read);
   char* line = readline(&serial);
   ASSERT_NE(line, nullptr);
   EXPECT_STREQ(line, "at+jvcn");  // the terminator is dropped; case is the reader loop's work
@@ -163,7 +142,7 @@ TEST_F(TransportTest, ReaderKeepsAnEarlierStartWithinOneCall) {
   // A read with T at byte 1 but no A at byte 0 is taken only after an A was seen in the
   // same call; it is copied whole.
   for (const char* read : {"xT+JVCN\n", "A\n", "xT+JVCN\n"})
-    ASSERT_GT(::write(station_, read, std::strlen(read)), 0);
+    port_.send(read);
   char* line = readline(&serial);
   ASSERT_NE(line, nullptr);
   EXPECT_STREQ(line, "xT+JVCN");
@@ -171,7 +150,7 @@ TEST_F(TransportTest, ReaderKeepsAnEarlierStartWithinOneCall) {
 
 TEST_F(TransportTest, SocketLineKeepsItsLastByte) {
   use_socket();
-  ASSERT_EQ(::write(station_, "AT+JVCN", 7), 7);
+  port_.send("AT+JVCN");
   char* line = readline(&serial);
   ASSERT_NE(line, nullptr);
   EXPECT_STREQ(line, "AT+JVCN");
@@ -183,7 +162,7 @@ TEST_F(TransportTest, ReaderLoopAnswersUnknownAndEmergencyLinesItself) {
   // The loop returns after the over-long line, so the whole exchange runs in-process.
   const std::string long_line = "AT" + std::string(198, 'x');
   for (const std::string& read : {std::string("  "), std::string("ati  "), std::string("atd112;"), long_line}) {
-    ASSERT_EQ(::write(station_, read.data(), read.size()), static_cast<ssize_t>(read.size()));
+    port_.send(read);
   }
   readerLoop(&serial);
   EXPECT_EQ(drain(), "ATI\r\nERROR\r\nATD112;\r\nOK\r\n\r\nERROR\r\n");

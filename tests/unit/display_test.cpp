@@ -6,7 +6,7 @@
 
 #include "commands/display.h"
 #include "core/command.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "services/ulda_nvram.h"
 #include "tests/unit/handler_call.h"
 #include "tests/unit/worker_port.h"

@@ -26,8 +26,8 @@ class FileTransferTest : public PortTest {
   // Queues the chunks, one read each, then ends the station's side: a handler that reads
   // past them sees the port fail instead of waiting for good.
   HandlerAnswer transfer(const std::string& line, const Chunks& chunks) {
-    for (const std::string& c : chunks) ::send(station_, c.data(), c.size(), 0);
-    ::shutdown(station_, SHUT_WR);
+    for (const std::string& c : chunks) port_.send(c);
+    port_.hang_up();
     return call_handler(jvfile_handler, line);
   }
 };
@@ -37,23 +37,23 @@ TEST_F(FileTransferTest, StoresExactlyTheBytesSent) {
   for (int i = 0; i < 256; ++i) all += static_cast<char>(i);
   const std::string text = encode(all);
   struct Case {
-    const char* port;
+    PortKind port;
     std::string line;
     Chunks chunks;
     std::string stored;
   };
   const Case cases[] = {
       // Lines of an even length; a line end alone is dropped.
-      {"/dev/ttyGS0", "AT+JVFILE=1,ALL.BIN,256", {text.substr(0, 100) + "\n", "\n", text.substr(100) + "\n"}, all},
+      {PortKind::tty, "AT+JVFILE=1,ALL.BIN,256", {text.substr(0, 100) + "\n", "\n", text.substr(100) + "\n"}, all},
       // Each tty read on its own: an odd one adds its pairs and loses its last character.
-      {"/dev/ttyGS0", "AT+JVFILE=1,ALL.BIN,3", {"3132333"}, "123"},
+      {PortKind::tty, "AT+JVFILE=1,ALL.BIN,3", {"3132333"}, "123"},
       // The socket is one stream: pairs straddle reads, line ends are not content.
-      {"socket", "AT+JVFILE=1,ALL.BIN,4", {"31", "3", "2\r\n3", "334"}, "1234"},
-      {"/dev/ttyGS0", "AT+JVFILE=1,ALL.BIN,-5", {}, ""},
+      {PortKind::socket, "AT+JVFILE=1,ALL.BIN,4", {"31", "3", "2\r\n3", "334"}, "1234"},
+      {PortKind::tty, "AT+JVFILE=1,ALL.BIN,-5", {}, ""},
   };
   for (const Case& c : cases) {
-    SCOPED_TRACE(c.line + " " + c.port);
-    use_port(c.port);
+    SCOPED_TRACE(c.line);
+    port_.open(c.port);
     write_file("/data/all.bin", "OLD");
     shell_commands().clear();
     EXPECT_EQ(transfer(c.line, c.chunks).status, RESULT_OK);
@@ -71,7 +71,7 @@ TEST_F(FileTransferTest, RefusedNamesAndLengthsChangeNothing) {
                                  "AT+JVFILE=1,..,1", "AT+JVFILE=1,LINK,1", "AT+JVFILE=1,A;B,1",
                                  "AT+JVFILE=1,BIG,2147483648", "AT+JVFILE=2,FIFO,0",
                                  "AT+JVFILE=1,NAME_OF_24_CHARACTERS_X4,1"}) {
-    use_port("/dev/ttyGS0");
+    port_.open(PortKind::tty);
     const HandlerAnswer a = transfer(line, {"3132\n"});
     EXPECT_EQ(a.status, RESULT_ERROR) << line;
     EXPECT_EQ(a.body, "") << line;
@@ -79,7 +79,7 @@ TEST_F(FileTransferTest, RefusedNamesAndLengthsChangeNothing) {
   EXPECT_EQ(read_file("/data/target"), "T");
   EXPECT_FALSE(exists("/data/big"));
   EXPECT_TRUE(shell_commands().empty());
-  use_port("/dev/ttyGS0");
+  port_.open(PortKind::tty);
   EXPECT_EQ(transfer("AT+JVFILE=1,NAME_OF_23_CHARACTERS_X,1", {"31\n"}).status, RESULT_OK);
 }
 

@@ -11,10 +11,11 @@
 #include <vector>
 
 #include "commands/gps_fm.h"
+#include "commands/identity.h"
 #include "core/command.h"
-#include "core/serial.h"
 #include "tests/unit/device_root.h"
 #include "tests/unit/handler_call.h"
+#include "tests/unit/station_port.h"
 
 namespace {
 
@@ -35,12 +36,7 @@ class GpsTest : public DeviceRootTest {
  protected:
   void SetUp() override {
     DeviceRootTest::SetUp();
-    saved_serial_ = serial;
-    saved_sp_ = is_sp;
-    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, port_), 0);
-    std::memset(&serial, 0, sizeof serial);
-    serial.fd[0] = port_[0];
-    serial.fd[1] = -1;
+    port_.open(PortKind::tty);
     is_sp = 1;
     gps_workers_peak = 0;
   }
@@ -49,10 +45,7 @@ class GpsTest : public DeviceRootTest {
     std::filesystem::remove_all(host_path("/.emu/modem"));
     EXPECT_EQ(gps(("AT+JVGPS=0")), RESULT_OK);
     EXPECT_EQ(gps_workers_running.load(), 0);
-    serial = saved_serial_;
-    is_sp = saved_sp_;
-    ::close(port_[0]);
-    ::close(port_[1]);
+    port_.close();
     DeviceRootTest::TearDown();
   }
 
@@ -70,16 +63,9 @@ class GpsTest : public DeviceRootTest {
     return n;
   }
 
-  std::string port_output() {
-    char buf[1024];
-    ssize_t n;
-    while ((n = ::recv(port_[1], buf, sizeof buf, MSG_DONTWAIT)) > 0) received_.append(buf, n);
-    return received_;
-  }
+  std::string port_output() { return received_ += port_.drain(); }
 
-  SerialDevice saved_serial_{};
-  int32_t saved_sp_ = 0;
-  int port_[2] = {-1, -1};
+  StationPort port_;
   std::string received_;
 };
 
@@ -118,6 +104,23 @@ TEST_F(GpsTest, CloseThenOpenAndStreamAtOnceNeverRunsTwoWorkers) {
   }
   EXPECT_EQ(gps_workers_peak.load(), 1);
   EXPECT_EQ(requests().back(), "3 0");
+}
+
+// The poll's answers land on the modem's thread while handlers read other items: every answer
+// must be the one its own request asked for.
+TEST_F(GpsTest, PollNeverSpoilsAnotherRequestsAnswer) {
+  write_file("/.emu/modem/gps/2", "$GPGGA,fix\r\n");
+  write_file("/.emu/modem/nv/6853", "PCB0001");
+  write_file("/.emu/modem/nv/66024", "TDNV-66024");
+  ASSERT_EQ(gps("AT+JVGPS=1"), RESULT_OK);
+  ASSERT_EQ(gps("AT+JVGPS=2"), RESULT_OK);
+  ASSERT_TRUE(eventually([&] { return polls() >= 1; }));
+  const size_t polls_before = polls();
+  for (int i = 0; i < 300 || polls() < polls_before + 3; ++i) {
+    ASSERT_EQ(call_handler(imei_and_pcb_code_on_handler, "AT+EGMR=0,5").body, "PCB0001") << i;
+    ASSERT_EQ(call_handler(nv_66024_handler, "AT+JVTDNV=0").body, "TDNV-66024") << i;
+  }
+  EXPECT_EQ(gps("AT+JVGPS=0"), RESULT_OK);
 }
 
 TEST_F(GpsTest, ModemFailures) {

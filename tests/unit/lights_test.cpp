@@ -13,7 +13,7 @@
 #include "commands/lights.h"
 #include "commands/worker.h"
 #include "core/command.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "services/ulda_nvram.h"
 #include "tests/unit/handler_call.h"
 #include "tests/unit/worker_port.h"

@@ -18,15 +18,16 @@
 #include <thread>
 #include <vector>
 
-#include "core/serial.h"
 #include "platform/host/host_hooks.h"
 #include "tests/unit/device_root.h"
 #include "tests/unit/qemu_skips.h"
+#include "tests/unit/station_port.h"
 
 namespace {
 
 using Files = std::vector<std::pair<std::string, std::string>>;
-using IntRequest = int (*)(qmi::client_type*, qmi::txn_handle*, const kro_int_req_msg_v01*);
+using IntRequest = int (*)(qmi::client_type*, qmi::txn_handle*, const kro_int_req_msg_v01*,
+                          QmiResult*);
 
 constexpr int32_t kUntouched = 0x5a5a5a5a;
 
@@ -50,46 +51,37 @@ ProcSample sample(pid_t pid) {
   return out;
 }
 
-std::vector<int32_t> oem_values() { return {oem_buf, oem_buf + 32}; }
-
 class QmiClientTest : public DeviceRootTest {
  protected:
   void SetUp() override {
     DeviceRootTest::SetUp();
-    saved_serial_ = serial;
-    saved_uart_ = is_uart_flag;
-    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, port_), 0);
-    std::memset(&serial, 0, sizeof serial);
-    serial.fd[0] = port_[0];
-    serial.fd[1] = -1;
-    is_uart_flag = 0;
-    reset_results();
+    port_.open(PortKind::tty);
   }
   void TearDown() override {
-    serial = saved_serial_;
-    is_uart_flag = saved_uart_;
-    ::close(port_[0]);
-    ::close(port_[1]);
+    port_.close();
     DeviceRootTest::TearDown();
   }
 
-  static void reset_results() {
-    std::strcpy(return_buffer, "stale");
-    std::fill(std::begin(oem_buf), std::end(oem_buf), kUntouched);
-    qmi_flag = -99;
+  // A fresh modem whose last answers left the text "stale", the OEM block all kUntouched and
+  // no transport error, with no request logged.
+  void reset_modem() {
+    std::filesystem::remove_all(host_path("/.emu/modem"));
+    std::string oem;
+    for (int i = 0; i < 32; ++i) oem += std::to_string(kUntouched) + " ";
+    write_file("/.emu/modem/nv/9.oem", oem);
+    write_file("/.emu/modem/nv/8", "stale");
+    ASSERT_EQ(read_nv(9), 0);
+    ASSERT_EQ(read_nv(8), 0);
+    std::filesystem::remove_all(host_path("/.emu/modem"));
   }
+  std::vector<int32_t> oem_values() const { return {last_.oem, last_.oem + 32}; }
+  std::string text() const { return last_.text; }
 
   void write_files(const Files& files) {
     for (const auto& [path, content] : files) write_file(path, content);
   }
 
-  std::string port_output() {
-    std::string out;
-    char buf[1024];
-    ssize_t n;
-    while ((n = ::recv(port_[1], buf, sizeof buf, MSG_DONTWAIT)) > 0) out.append(buf, n);
-    return out;
-  }
+  std::string port_output() { return port_.drain(); }
 
   std::string last_request() {
     std::istringstream log(read_file("/.emu/modem/requests.log"));
@@ -104,36 +96,35 @@ class QmiClientTest : public DeviceRootTest {
     EXPECT_EQ(host_qmi_live_workers(), 0) << what;
   }
 
-  static int read_nv(uint32_t item, uint8_t opt0 = 0, uint8_t opt1 = 0) {
+  int read_nv(uint32_t item, uint8_t opt0 = 0, uint8_t opt1 = 0) {
     kro_read_nv_info_req_msg_v01 req{};
     req.nvItem_id = item;
     req.option[0] = opt0;
     req.option[1] = opt1;
     qmi::client_type clnt = nullptr;
     qmi::txn_handle txn = 0;
-    return qmi_kro_read_nv_msg(&clnt, &txn, &req);
+    return qmi_kro_read_nv_msg(&clnt, &txn, &req, &last_);
   }
 
-  static int write_nv(uint32_t item, const std::string& text) {
+  int write_nv(uint32_t item, const std::string& text) {
     kro_write_nv_info_req_msg_v01 req{};
     req.nvItem_id = item;
     req.buffer_valid = 1;
     std::memcpy(req.buffer, text.data(), std::min(text.size(), sizeof req.buffer));
     qmi::client_type clnt = nullptr;
     qmi::txn_handle txn = 0;
-    return qmi_kro_write_nv_msg(&clnt, &txn, &req);
+    return qmi_kro_write_nv_msg(&clnt, &txn, &req, &last_);
   }
 
-  static int int_request(IntRequest fn, int32_t value) {
+  int int_request(IntRequest fn, int32_t value) {
     kro_int_req_msg_v01 req{value};
     qmi::client_type clnt = nullptr;
     qmi::txn_handle txn = 0;
-    return fn(&clnt, &txn, &req);
+    return fn(&clnt, &txn, &req, &last_);
   }
 
-  SerialDevice saved_serial_{};
-  int32_t saved_uart_ = 0;
-  int port_[2] = {-1, -1};
+  QmiResult last_{};
+  StationPort port_;
 };
 
 std::vector<int32_t> untouched_oem() { return std::vector<int32_t>(32, kUntouched); }
@@ -179,13 +170,12 @@ TEST_F(QmiClientTest, ReadNvLeavesTextOrOemBlock) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    std::filesystem::remove_all(host_path("/.emu/modem/nv"));
+    reset_modem();
     write_files(c.files);
-    reset_results();
     EXPECT_EQ(read_nv(c.item, c.opt0, c.opt1), 0) << c.name;
-    EXPECT_EQ(std::string(return_buffer), c.want_text) << c.name;
+    EXPECT_EQ(text(), c.want_text) << c.name;
     EXPECT_EQ(oem_values(), c.want_oem) << c.name;
-    EXPECT_EQ(qmi_flag, 0) << c.name;
+    EXPECT_EQ(last_.flag, 0) << c.name;
     EXPECT_EQ(last_request(), "1 " + std::to_string(c.item) + " " + std::to_string(c.opt0) + "," +
                                   std::to_string(c.opt1))
         << c.name;
@@ -208,13 +198,12 @@ TEST_F(QmiClientTest, WriteNvStoresTheTextForLaterReads) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    reset_results();
     EXPECT_EQ(write_nv(6853, c.value), 0) << c.name;
     EXPECT_EQ(read_file("/.emu/modem/nv/6853"), c.stored) << c.name;
     EXPECT_EQ(last_request(), "2 6853 0,0 " + c.stored) << c.name;
-    EXPECT_EQ(qmi_flag, 0) << c.name;
+    EXPECT_EQ(last_.flag, 0) << c.name;
     EXPECT_EQ(read_nv(6853), 0) << c.name;
-    EXPECT_EQ(std::string(return_buffer), c.stored) << c.name;
+    EXPECT_EQ(text(), c.stored) << c.name;
     expect_settled(c.name);
   }
   EXPECT_FALSE(exists("/.emu/modem/nv/.6853.tmp"));
@@ -246,12 +235,11 @@ TEST_F(QmiClientTest, StatusAndAntennaRequests) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    std::filesystem::remove_all(host_path("/.emu/modem"));
+    reset_modem();
     write_files(c.files);
-    reset_results();
     EXPECT_EQ(int_request(c.fn, c.value), 0) << c.name;
-    EXPECT_EQ(std::string(return_buffer), c.want_text) << c.name;
-    EXPECT_EQ(qmi_flag, 0) << c.name;
+    EXPECT_EQ(text(), c.want_text) << c.name;
+    EXPECT_EQ(last_.flag, 0) << c.name;
     EXPECT_EQ(oem_values(), untouched_oem()) << c.name;
     EXPECT_EQ(last_request(), c.want_request) << c.name;
     EXPECT_EQ(port_output(), "") << c.name;
@@ -276,16 +264,15 @@ TEST_F(QmiClientTest, GpsOptionAnswerIsWrittenToThePort) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    std::filesystem::remove_all(host_path("/.emu/modem"));
+    reset_modem();
     write_files(c.files);
-    reset_results();
     kro_gps_option_req_msg_v01 req{c.option};
     qmi::client_type clnt = nullptr;
     qmi::txn_handle txn = 0;
-    EXPECT_EQ(qmi_kro_gps_option_msg(&clnt, &txn, &req), 0) << c.name;
+    EXPECT_EQ(qmi_kro_gps_option_msg(&clnt, &txn, &req, &last_), 0) << c.name;
     // Written by the callback before the request returned.
     EXPECT_EQ(port_output(), c.want_port) << c.name;
-    EXPECT_EQ(std::string(return_buffer), "") << c.name;
+    EXPECT_EQ(text(), "") << c.name;
     EXPECT_EQ(last_request(), "3 " + std::to_string(c.option)) << c.name;
     expect_settled(c.name);
   }
@@ -302,9 +289,9 @@ TEST_F(QmiClientTest, FailuresReachTheCallerOnlyAsStatusOrFlag) {
     std::string want_text;
     bool sent;
   } cases[] = {
-      {"client init fails", {{"/.emu/modem/init_error", "-2"}}, false, -1, -99, "stale", false},
-      {"send fails", {{"/.emu/modem/send_error", "-1"}}, true, -1, -99, "stale", false},
-      {"malformed send switch", {{"/.emu/modem/send_error", "yes"}}, false, -1, -99, "stale", false},
+      {"client init fails", {{"/.emu/modem/init_error", "-2"}}, false, -1, 0, "stale", false},
+      {"send fails", {{"/.emu/modem/send_error", "-1"}}, true, -1, 0, "stale", false},
+      {"malformed send switch", {{"/.emu/modem/send_error", "yes"}}, false, -1, 0, "stale", false},
       {"switch set to 0", {{"/.emu/modem/send_error", "0"}}, false, 0, 0, "OLD", true},
       {"transport error on read", {{"/.emu/modem/transport_error", "5"}}, false, 0, 5, "", true},
       {"transport error on write", {{"/.emu/modem/transport_error", "-4"}}, true, 0, -4, "", true},
@@ -312,14 +299,13 @@ TEST_F(QmiClientTest, FailuresReachTheCallerOnlyAsStatusOrFlag) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    std::filesystem::remove_all(host_path("/.emu/modem"));
+    reset_modem();
     write_file("/.emu/modem/nv/6853", "OLD");
     write_file("/.emu/modem/nv/6853.oem", "1 2");
     write_files(c.files);
-    reset_results();
     EXPECT_EQ(c.write ? write_nv(6853, "NEW") : read_nv(6853), c.want_rc) << c.name;
-    EXPECT_EQ(qmi_flag, c.want_flag) << c.name;
-    EXPECT_EQ(std::string(return_buffer), c.want_text) << c.name;
+    EXPECT_EQ(last_.flag, c.want_flag) << c.name;
+    EXPECT_EQ(text(), c.want_text) << c.name;
     EXPECT_EQ(oem_values(), untouched_oem()) << c.name;
     EXPECT_EQ(read_file("/.emu/modem/nv/6853"), "OLD") << c.name;
     EXPECT_EQ(exists("/.emu/modem/requests.log"), c.sent) << c.name;
@@ -353,9 +339,8 @@ TEST_F(QmiClientTest, SemaphoreVariantsFillTheCallersBuffers) {
   };
   // clang-format on
   for (const auto& c : cases) {
-    std::filesystem::remove_all(host_path("/.emu/modem"));
+    reset_modem();
     write_files(c.files);
-    reset_results();
     // Guard bytes behind the declared length must survive.
     unsigned char resp[512];
     std::memset(resp, 0xee, sizeof resp);
@@ -393,9 +378,6 @@ TEST_F(QmiClientTest, SemaphoreVariantsFillTheCallersBuffers) {
       EXPECT_EQ(r.buffer_valid, 1) << c.name;
       EXPECT_EQ(std::string(r.buffer), c.want_text) << c.name;
     }
-    // The variants leave the fixed requests' globals alone.
-    EXPECT_EQ(std::string(return_buffer), "stale") << c.name;
-    EXPECT_EQ(qmi_flag, -99) << c.name;
     expect_settled(c.name);
   }
 }

@@ -11,9 +11,9 @@
 #include <functional>
 #include <string>
 
-#include "core/serial.h"
 #include "services/ulda_nvram.h"
 #include "tests/unit/device_root.h"
+#include "tests/unit/station_port.h"
 
 class RecordTest : public DeviceRootTest {
  public:
@@ -44,32 +44,12 @@ class PortTest : public RecordTest {
  protected:
   void SetUp() override {
     RecordTest::SetUp();
-    use_port("/dev/ttyGS0");
+    port_.open(PortKind::tty);
   }
   void TearDown() override {
-    use_port(nullptr);
-    is_uart_flag = 0;
+    port_.close();
     RecordTest::TearDown();
   }
-  // Sequenced packets: one send is one read, as a canonical tty's lines arrive.
-  void use_port(const char* device_name) {
-    for (int fd : {station_, serial.fd[0]})
-      if (fd >= 0) ::close(fd);
-    initSerialDevice(&serial);
-    station_ = -1;
-    if (device_name == nullptr) return;
-    int pair[2];
-    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, pair), 0);
-    std::strcpy(serial.dev_name[0], device_name);
-    serial.fd[0] = pair[0];
-    station_ = pair[1];
-  }
-  std::string drain() {
-    std::string out;
-    char buf[8192];
-    ::fcntl(station_, F_SETFL, O_NONBLOCK);
-    for (ssize_t n; (n = ::read(station_, buf, sizeof buf)) > 0;) out.append(buf, n);
-    return out;
-  }
-  int station_ = -1;
+  std::string drain() { return port_.drain(); }
+  StationPort port_;
 };

@@ -9,6 +9,7 @@
 
 #include "tests/unit/handler_call.h"
 #include "tests/unit/record_fixture.h"
+#include "tests/unit/worker_port.h"
 
 namespace {
 
@@ -52,7 +53,7 @@ TEST_F(UsbAdbTest, FailedCloseLeavesRecordAndUsbAlone) {
   EXPECT_EQ(get_property("persist.sys.usb.config"), "mtp,adb");
   EXPECT_EQ(drain(), "");
   EXPECT_TRUE(shell_commands().empty());
-  EXPECT_EQ(usb_watch_count.load(), 0);
+  EXPECT_EQ(running_workers(), 0);
 }
 
 TEST_F(UsbAdbTest, EachWatchEndsWhenTheCableIsPulled) {
@@ -60,15 +61,12 @@ TEST_F(UsbAdbTest, EachWatchEndsWhenTheCableIsPulled) {
   EXPECT_EQ(call_handler(jvadb_handler, "AT+JVADB=0,3").status, RESULT_OK);
   put_record(adb_open());
   EXPECT_EQ(call_handler(jvadb_handler, "AT+JVADB=0,3").status, RESULT_OK);
-  EXPECT_EQ(usb_watch_count.load(), 2);
+  EXPECT_EQ(running_workers(), 2);
   EXPECT_EQ(drain(), "AT+JVADB=0,3\r\nOK\r\nAT+JVADB=0,3\r\nOK\r\n");
   EXPECT_EQ(record_bytes(), bytes_of(patterned([](ulda_nvram& r) { r.adb_flag = 0; })));
   EXPECT_EQ(get_property("persist.sys.usb.config"), "charging");
   write_file("/sys/class/power_supply/usb/online", "0\n");
-  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(60);
-  while (usb_watch_count.load() != 0 && std::chrono::steady_clock::now() < deadline)
-    std::this_thread::sleep_for(std::chrono::milliseconds(20));
-  ASSERT_EQ(usb_watch_count.load(), 0);
+  ASSERT_TRUE(wait_until([] { return running_workers() == 0; }));
   Commands expected = kCloseAdb;
   expected.insert(expected.end(), kCloseAdb.begin(), kCloseAdb.end());
   expected.insert(expected.end(), {kShutDown, kShutDown});

@@ -5,7 +5,7 @@
 
 #include "commands/wlan.h"
 #include "core/command.h"
-#include "core/serial.h"
+#include "core/transport.h"
 #include "tests/unit/device_root.h"
 #include "tests/unit/handler_call.h"
 
