@@ -109,7 +109,7 @@ std::vector<KeyCase> key_cases() {
       {"keysaved_no_tool", "AT+PEMUKP=1,KEYSAVED", kNotFound, "true", kUnknown, "", keysaved, true},
       {"getkey", "AT+PEMUKP=1,GETKEY", 0, "MIIBIjAN", OK, "\"MIIBIjAN\"", getkey, false},
       {"getkey_cut", "AT+PEMUKP=1,GETKEY", 0, long_key.c_str(), OK,
-       "\"" + std::string(600, 'k') + "\"", getkey, false},
+       std::string(1, '"').append(600, 'k').append(1, '"'), getkey, false},
       {"getkey_no_shell", "AT+PEMUKP=1,GETKEY", -1, nullptr, ERR, "", getkey, false},
       {"getuniqueid", "at+pemukp=1,getuniqueid", 0, "ID42", OK, "\"ID42\"", getid, false},
       {"other", "AT+PEMUKP=1,GENKEY2", 0, nullptr, ERR, "", "", false},
