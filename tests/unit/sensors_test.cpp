@@ -20,7 +20,7 @@ namespace {
 using Pairs = std::vector<std::pair<std::string, std::string>>;
 using Fields = std::vector<std::pair<size_t, int32_t>>;  // record offset -> value
 
-constexpr int32_t kFill = 0x5a5a5a5a;
+constexpr char kFill = '\x5a';  // every byte of the record before a test
 const std::string kRecord = "/persist/ulda_nvram";
 
 struct SensorCase {
@@ -81,7 +81,7 @@ class SensorTest : public WorkerPortTest {
   void SetUp() override {
     WorkerPortTest::SetUp();
     write_file("/dev/__properties__/ro.build.version.kro", "KRO-1");
-    write_file(kRecord, std::string(ULDA_NVRAM_SIZE, '\x5a'));
+    write_file(kRecord, std::string(ULDA_NVRAM_SIZE, kFill));
   }
   void set_field(size_t offset, int32_t value) {
     std::string record = read_file(kRecord);
@@ -99,7 +99,7 @@ TEST_P(SensorCommand, AnswersAndRecordsExactly) {
   const HandlerAnswer answer = call_handler(c.handler, c.line);
   EXPECT_EQ(answer.status, c.status);
   EXPECT_EQ(answer.body, c.body);
-  std::string expected(ULDA_NVRAM_SIZE, '\x5a');
+  std::string expected(ULDA_NVRAM_SIZE, kFill);
   for (const auto& [offset, value] : c.after) std::memcpy(expected.data() + offset, &value, 4);
   EXPECT_EQ(read_file(kRecord), expected);
   for (const auto& [name, value] : c.properties) EXPECT_EQ(get_property(name), value) << name;
@@ -127,7 +127,7 @@ TEST_F(SensorTest, FailedRecordWriteKeepsBodyAndProperties) {
   EXPECT_EQ(answer.status, RESULT_ERROR);
   EXPECT_EQ(answer.body, "\"55\"\r\n");
   EXPECT_EQ(get_property("persist.sys.base_threshold_prox"), "55");
-  EXPECT_EQ(read_file(kRecord), std::string(ULDA_NVRAM_SIZE, '\x5a'));
+  EXPECT_EQ(read_file(kRecord), std::string(ULDA_NVRAM_SIZE, kFill));
   write_file("/.emu/sensor/48", pass("1 2 3"));
   EXPECT_EQ(call_handler(jvzljc_handler, "AT+JVZLJC=0,5").status, RESULT_ERROR);
   EXPECT_EQ(get_property("persist.sys.gs_cal_flag"), "2");
