@@ -1,9 +1,10 @@
 """The daemon core as a station sees it: start-up modes, line rules and answer framing."""
 
 import os
+import socket
+import struct
 import subprocess
 import termios
-import time
 
 import pytest
 
@@ -15,22 +16,11 @@ from conftest import BINARY, BLOCK, PATIENCE, TcpPhone, TtyPhone, framed_tcp, fr
 UNSPECIFIED = b"AT+JVLIFE"
 
 
-@pytest.mark.parametrize("line, answer", [
-    # An unknown name gets the reader's own answer: the upper-cased line, then ERROR.
-    (b"ATI", b"ATI\r\nERROR\r\n"),
-    (b"at+nothere=1", b"AT+NOTHERE=1\r\nERROR\r\n"),
-    # Trailing blanks are trimmed before the lookup.
-    (b"AT+NOTHERE   ", b"AT+NOTHERE\r\nERROR\r\n"),
-    # Known name, unsupported form: echo, empty body, "Not Implement".
-    (UNSPECIFIED + b"?", framed_tty(UNSPECIFIED + b"?", b"", b"Not Implement")),
-    (UNSPECIFIED + b"=?", framed_tty(UNSPECIFIED + b"=?", b"", b"Not Implement")),
-    (b"at+jvlife?x=1", framed_tty(b"AT+JVLIFE?X=1", b"", b"Not Implement")),
-    (UNSPECIFIED + b"=1", framed_tty(UNSPECIFIED + b"=1", b"", b"Not Implement")),
-    # The emergency call is answered OK by the reader itself.
-    (b"atd112;", b"ATD112;\r\nOK\r\n"),
-])
-def test_tty_answers(usb_phone, line, answer):
-    assert usb_phone.command(line) == answer
+def test_tty_answers(usb_phone):
+    # The reader's own answer to an unknown name, and the dispatcher's frame.
+    assert usb_phone.command(b"at+nothere=1  ") == b"AT+NOTHERE=1\r\nERROR\r\n"
+    assert usb_phone.command(UNSPECIFIED + b"=1") == \
+        framed_tty(UNSPECIFIED + b"=1", b"", b"Not Implement")
 
 
 @pytest.mark.parametrize("map_cr, answer", [
@@ -51,25 +41,6 @@ def test_tty_line_ended_by_cr_lf(device_root, map_cr, answer):
         assert phone.command(b"AT+JVLIFE", end=b"\r\n") == answer
     finally:
         phone.stop()
-
-
-def test_tty_line_rules(usb_phone):
-    # Reads that do not begin with A, T are discarded without an answer.
-    for junk in (b"  AT+JVLIFE", b"A", b"T+JVLIFE", b"hello"):
-        usb_phone.send(junk + b"\n")
-        assert usb_phone.receive(timeout=0.6) == b""
-    # A line of 199 characters is served; the emergency call still works afterwards.
-    line = b"AT+NOTHERE=" + b"X" * 188
-    assert len(line) == 199
-    assert usb_phone.command(line) == line + b"\r\nERROR\r\n"
-    assert usb_phone.command(b"ATD112;") == b"ATD112;\r\nOK\r\n"
-    assert any("am broadcast -a kro.intent.action.AT_EMERG_CALL" in cmd
-               for cmd in usb_phone.shell_log())
-
-
-def test_tty_line_of_200_characters_ends_the_daemon(usb_phone):
-    assert usb_phone.command(b"AT+NOTHERE=" + b"X" * 189) == b"\r\nERROR\r\n"
-    assert usb_phone.wait() == 0
 
 
 def test_tty_end_of_service_command_closes_the_port(usb_phone):
@@ -143,35 +114,36 @@ def test_tcp_listen_address(device_root, listen, address):
         proc.wait()
 
 
+SO_TIMESTAMPNS = getattr(socket, "SO_TIMESTAMPNS", 35)  # Linux's value; Python 3.11 lacks it
+
+
 def test_tcp_blocks_are_padded_and_paced(tcp_phone):
+    # The kernel stamps each block when it reaches the socket, so a test that is itself kept
+    # waiting by a busy machine still sees the daemon's pauses. Each block is one segment on
+    # loopback; reading no further than its end takes its stamp alone.
+    sock = tcp_phone.sock
+    sock.setsockopt(socket.SOL_SOCKET, SO_TIMESTAMPNS, 1)
+    sock.settimeout(PATIENCE)
+    # The kernel turns stamping on a moment after the first socket asks for it.
+    assert tcp_phone.command(b"ATI") == b"ATI\r\nERROR\r\n"
     tcp_phone.send(UNSPECIFIED + b"=1")
-    tcp_phone.sock.settimeout(PATIENCE)
-    data = b""
-    block_arrival = {}
+    data, stamps = b"", []
     while len(data) < 3 * BLOCK:
-        chunk = tcp_phone.sock.recv(3 * BLOCK - len(data))
+        chunk, ancillary, _, _ = sock.recvmsg(BLOCK - len(data) % BLOCK, 64)
         assert chunk, "answer stopped early"
-        block_arrival.setdefault(len(data) // BLOCK, time.monotonic())
+        if len(data) % BLOCK == 0:
+            seconds, nanoseconds = struct.unpack("qq", ancillary[0][2][:16])
+            stamps.append(seconds + nanoseconds / 1e9)
         data += chunk
     assert data == framed_tcp(UNSPECIFIED + b"=1", b"", b"Not Implement")
     # Each block follows the one before it after a pause of 100 ms.
-    assert sorted(block_arrival) == [0, 1, 2]
-    assert block_arrival[1] - block_arrival[0] >= 0.09
-    assert block_arrival[2] - block_arrival[1] >= 0.09
-
-
-@pytest.mark.parametrize("line, answer", [
-    (b"ATI", b"ATI\r\nERROR\r\n"),
-    (b"ATD112;", b"ATD112;\r\nOK\r\n"),
-    # The socket has no line end to drop: a CR LF sent by the station stays in the line.
-    (b"ATI\r\n", b"ATI\r\n\r\nERROR\r\n"),
-    (UNSPECIFIED + b"?", framed_tcp(UNSPECIFIED + b"?", b"", b"Not Implement")),
-])
-def test_tcp_answers(tcp_phone, line, answer):
-    assert tcp_phone.command(line) == answer
+    assert stamps[1] - stamps[0] >= 0.099
+    assert stamps[2] - stamps[1] >= 0.099
 
 
 def test_tcp_line_of_200_characters_ends_the_daemon(tcp_phone):
+    # The socket has no line end to drop: a CR LF sent by the station stays in the line.
+    assert tcp_phone.command(b"ATI\r\n") == b"ATI\r\n\r\nERROR\r\n"
     tcp_phone.send(b"AT" + b"X" * 198)
     assert tcp_phone.receive() == b"\r\nERROR\r\n"
     assert tcp_phone.wait() == 0
@@ -180,14 +152,9 @@ def test_tcp_line_of_200_characters_ends_the_daemon(tcp_phone):
 @pytest.mark.parametrize("cmdline, kroem, expected", [
     # Console mode and uart2 together choose the UART whatever the property says.
     ("console=sendAT androidboot.uart=uart2", "2", "uart"),
-    ("androidboot.uart=uart2 console=debugAT", "", "uart"),
-    # uart2 without a console mode, or hidden behind an empty token, is not the UART.
-    ("console=ttyHSL0 androidboot.uart=uart2", "1", "usb"),
-    ("console=sendAT  androidboot.uart=uart2", "1", "usb"),
     # Only the property's first character chooses the socket.
     ("console=ttyHSL0", "20", "tcp"),
     ("console=ttyHSL0", "1", "usb"),
-    ("console=ttyHSL0", "", "none"),
     ("console=ttyHSL0", "3", "none"),
 ])
 def test_port_selection(device_root, cmdline, kroem, expected):
