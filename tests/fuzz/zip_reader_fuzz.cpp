@@ -1,5 +1,4 @@
 // libFuzzer target for the zip reader: open any bytes as an archive and extract every entry.
-// Built by the fuzz test from zip_archive.cpp alone; not part of the daemon.
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
