@@ -203,7 +203,10 @@ def main(args, binary, make_view=None):
 
     def say(text):
         with out:
-            print(f"atcid-emu: {text}", flush=True)
+            try:
+                print(f"atcid-emu: {text}", flush=True)
+            except OSError:
+                pass  # nobody reads the output any more; the phones go on serving
 
     def on_power(phone, state):
         if phone.view is not None:
