@@ -2,7 +2,8 @@
 """How a fleet of emulated phones scales: for each N, the launcher starts N phones
 (`emulator/atcid-emu --count N`) and this script measures
 
-  - the time from starting the launcher until every phone serves (the launcher says so),
+  - the time from starting the launcher until every phone serves (the launcher says so), and
+    how much of it went into making the N roots (until the launcher lists the phones),
   - the memory per phone: the proportional set size (PSS, /proc/PID/smaps_rollup) of each
     phone's processes (its daemon and whatever the daemon started), and the launcher's own,
   - the wall time of a 20-step sequence run multi-up over TCP on all N phones, against the
@@ -112,11 +113,13 @@ class Launcher:
              "--count", str(count), "--root", str(root), "--port", str(port)],
             stdout=subprocess.PIPE, text=True)
         self.serving = threading.Event()
-        self.serving_after = None
+        self.serving_after = self.roots_after = None
         threading.Thread(target=self._read, daemon=True).start()
 
     def _read(self):
         for line in self.proc.stdout:
+            if self.roots_after is None and "phone-1 " in line:
+                self.roots_after = time.monotonic() - self.started
             if re.search(r"all \d+ phones serving", line):
                 self.serving_after = time.monotonic() - self.started
                 self.serving.set()
@@ -154,7 +157,7 @@ def measure(binary, count, work):
         many = timed_run(targets, steps)
     finally:
         launcher.stop()
-    return {"count": count, "serve": launcher.serving_after,
+    return {"count": count, "serve": launcher.serving_after, "roots": launcher.roots_after,
             "pss": sum(per_phone) / len(per_phone), "pss_max": max(per_phone),
             "launcher": launcher_kib, "one": one, "many": many}
 
@@ -166,16 +169,16 @@ def main():
     parser.add_argument("--counts", default="1,8,32,64")
     args = parser.parse_args()
     counts = [int(c) for c in args.counts.split(",")]
-    print("| phones | all serving after | PSS per phone (mean, max) | launcher PSS | "
-          "20 steps, one phone | 20 steps, all multi-up | ratio |")
+    print("| phones | all serving after (roots made after) | PSS per phone (mean, max) | "
+          "launcher PSS | 20 steps, one phone | 20 steps, all multi-up | ratio |")
     print("|---:|---:|---:|---:|---:|---:|---:|")
     with tempfile.TemporaryDirectory(prefix="atcid-fleet-bench-") as work:
         for count in counts:
             r = measure(args.bin, count, Path(work))
-            print(f"| {r['count']} | {r['serve']:.2f} s | {r['pss']:.0f} KiB, "
-                  f"{r['pss_max']} KiB | {r['launcher'] / 1024:.1f} MiB | {r['one']:.2f} s | "
-                  f"{r['many']:.2f} s | {r['many'] / r['one']:.2f} |", flush=True)
-
+            print(f"| {r['count']} | {r['serve']:.2f} s ({r['roots']:.2f} s) | "
+                  f"{r['pss']:.0f} KiB, {r['pss_max']} KiB | {r['launcher'] / 1024:.1f} MiB | "
+                  f"{r['one']:.2f} s | {r['many']:.2f} s | {r['many'] / r['one']:.2f} |",
+                  flush=True)
 
 if __name__ == "__main__":
     main()

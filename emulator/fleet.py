@@ -160,8 +160,11 @@ class Fleet:
             phone.stop()
 
     def wait(self):
+        # Joined in short slices: a signal that reached a service thread runs its handler
+        # only once the main thread wakes up.
         for phone in self.phones:
-            phone.thread.join()
+            while phone.thread.is_alive():
+                phone.thread.join(0.2)
 
     def close(self):
         for phone in self.phones:
