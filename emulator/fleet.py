@@ -72,6 +72,7 @@ class FleetPhone:
         self.state = "off"
         self.thread = None
         self.view = None  # a live view, when the launcher gives the phone one
+        self.identity = None  # set when the phone was made afresh
 
     @property
     def target(self):
@@ -112,7 +113,8 @@ class Fleet:
         for phone in self.phones:
             if not (self.keep and phone.root.exists()):
                 emulator.make_root(phone.root)
-                set_identity(phone.root, identity(phone.index))
+                phone.identity = identity(phone.index)
+                set_identity(phone.root, phone.identity)
             emulator.prepare_mode(phone.root, phone.mode)
             if phone.mode != "tcp":
                 phone.bridge = emulator.PtyBridge()
@@ -227,9 +229,10 @@ def main(args, binary, make_view=None):
               "the phones have no shell or tools", file=sys.stderr)
     say(f"{args.count} phones under {fleet.root}, each logging to its .emu/atcid.log")
     for phone in fleet.phones:
-        ident = identity(phone.index)
-        line = (f"{phone.name}  {phone.target}  serial {ident.serial}  IMEI {ident.imei}  "
-                f"barcode {ident.barcode}")
+        ident = phone.identity
+        line = f"{phone.name}  {phone.target}  " + (
+            f"serial {ident.serial}  IMEI {ident.imei}  barcode {ident.barcode}" if ident
+            else "kept root, identity as it holds it")
         if make_view is not None:
             phone.view = make_view(phone)
             phone.view.start()

@@ -35,6 +35,18 @@ def free_ports(count):
             continue
 
 
+def stop(launcher):
+    """Ctrl-C, so the launcher stops its daemons even when a test failed; a kill would leave
+    them serving."""
+    if launcher.poll() is None:
+        launcher.send_signal(signal.SIGINT)
+        try:
+            launcher.wait(timeout=PATIENCE)
+        except subprocess.TimeoutExpired:
+            launcher.kill()
+            launcher.wait()
+
+
 class Output:
     """The lines a launcher prints, read as they come."""
 
@@ -86,9 +98,7 @@ def test_fleet_identities_power_off_and_ctrl_c(tmp_path):
             with pytest.raises(Unreachable):
                 connect(f"tcp://127.0.0.1:{other}", connect_timeout=PATIENCE)
     finally:
-        if launcher.poll() is None:
-            launcher.kill()
-            launcher.wait()
+        stop(launcher)
 
 
 @pytest.fixture
@@ -126,11 +136,13 @@ def test_multi_up_run_reports_each_phone(two_phones, tmp_path):
     targets = tmp_path / "phones.txt"
     targets.write_text("# the line\n" + "\n".join(two_phones) + "\n")
     assert station("run", script, "--targets", targets).returncode == 1
+    assert station("run", script, two_phones[0]).returncode == 0
+    assert station(two_phones[0], "run", script).returncode == 0
 
 
 @pytest.mark.parametrize("with_target", [False, True])
-def test_pytest_plugin_phone(with_target, two_phones, tmp_path):
-    target = ["--atcid-target", two_phones[0]] if with_target else []
+def test_pytest_plugin_phone(with_target, request, tmp_path):
+    target = ["--atcid-target", request.getfixturevalue("two_phones")[0]] if with_target else []
     env = dict(os.environ, PYTHONPATH=str(SOURCE / "station"))
     run = subprocess.run(
         [sys.executable, "-m", "pytest", "-q", "-p", "no:cacheprovider", "-p",
@@ -145,16 +157,17 @@ def test_chat_on_the_usb_port(tmp_path):
     chat = shutil.which("chat", path=os.environ.get("PATH", "") + ":/usr/sbin")
     if chat is None:
         pytest.skip("chat (package ppp) is not installed; tools/install-deps installs it")
-    launcher = subprocess.Popen(LAUNCHER + ["--mode", "usb", "--root", str(tmp_path / "root")],
-                                stdout=subprocess.PIPE, text=True)
+    # A fleet of two on USB: each phone's port is its own pseudo-terminal.
+    launcher = subprocess.Popen(LAUNCHER + ["--mode", "usb", "--count", "2", "--root",
+                                            str(tmp_path)], stdout=subprocess.PIPE, text=True)
     out = Output(launcher.stdout)
     try:
-        device = out.wait_for("station side of the USB port").split()[-1]
+        out.wait_for("all 2 phones serving")
+        device = out.wait_for("phone-2 ").split()[2]
         for command, status in (("AT+JVMODEL=0", 0), ("AT+JVMODEL=9", 4)):
             with open(device, "r+b", buffering=0) as port:
                 ran = subprocess.run([chat, "-t", "20", "ABORT", "ERROR", "", command, "OK"],
                                      stdin=port, stdout=port, timeout=60)
             assert ran.returncode == status, command
     finally:
-        launcher.send_signal(signal.SIGTERM)
-        launcher.wait(timeout=PATIENCE)
+        stop(launcher)
