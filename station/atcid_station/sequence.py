@@ -205,4 +205,3 @@ def _run_command(phone, step, values):
 
 def _show(word):
     return "none" if word is None else repr(word)
-

@@ -17,7 +17,7 @@ import fleet
 from conftest import BINARY, PATIENCE, SOURCE, free_port
 
 sys.path.insert(0, str(SOURCE / "station"))
-from atcid_station import StationError, Unreachable, connect  # noqa: E402
+from atcid_station import Unreachable, connect  # noqa: E402
 
 LAUNCHER = [sys.executable, str(SOURCE / "emulator/atcid-emu"), "--bin", str(BINARY)]
 
@@ -61,10 +61,14 @@ class Output:
                 self.cond.notify_all()
 
     def wait_for(self, pattern):
+        """The first line that matches `pattern`, once it came."""
+        def found():
+            return next((line for line in self.lines if re.search(pattern, line)), None)
+
         with self.cond:
-            assert self.cond.wait_for(lambda: any(re.search(pattern, l) for l in self.lines),
-                                      PATIENCE), self.lines
-            return next(l for l in self.lines if re.search(pattern, l))
+            line = self.cond.wait_for(found, PATIENCE)
+            assert line is not None, self.lines
+            return line
 
 
 def test_fleet_identities_power_off_and_ctrl_c(tmp_path):
