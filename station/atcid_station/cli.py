@@ -4,9 +4,11 @@
     atcid-station /dev/ttyUSB0                                 interactive prompt
     atcid-station tcp://127.0.0.1 run checks.seq --junit report.xml
     atcid-station tcp://127.0.0.1 push firmware.bin fw.bin
+    atcid-station run checks.seq tcp://127.0.0.1:6888 tcp://127.0.0.1:6889 --junit report.xml
+    atcid-station run checks.seq --targets phones.txt          multi-up: all phones at once
 
-Exit status: 0 when every answer's result word is OK (every step passed), 1 otherwise,
-2 when the phone cannot be reached or the input is unusable.
+Exit status: 0 when every answer's result word is OK (every step passed on every phone),
+1 otherwise, 2 when a phone cannot be reached (or goes away) or the input is unusable.
 """
 
 import argparse
@@ -16,10 +18,12 @@ import sys
 import threading
 from pathlib import Path
 
+from . import multiup, sequence
 from . import push as push_mod
-from . import sequence
-from .link import DEFAULT_BAUD, LinkError
-from .station import DEFAULT_IDLE, DEFAULT_TIMEOUT, Station
+from .api import connect
+from .errors import StationError, TimedOut
+from .link import DEFAULT_BAUD
+from .station import DEFAULT_IDLE, DEFAULT_TIMEOUT
 
 EXIT_OK, EXIT_FAILED, EXIT_UNREACHABLE = 0, 1, 2
 
@@ -28,9 +32,11 @@ def build_parser():
     parser = argparse.ArgumentParser(
         prog="atcid-station", description=__doc__,
         formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("target", help="tcp://HOST[:PORT] (port 6888 by default) or a serial device")
+    parser.add_argument("target", help="tcp://HOST[:PORT] (port 6888 by default) or a serial "
+                                       "device; or `run` for a multi-up run")
     parser.add_argument("words", nargs="*", metavar="COMMAND",
-                        help="AT command lines, or: run SEQUENCE | push LOCAL NAME")
+                        help="AT command lines, or: run SEQUENCE | push LOCAL NAME; after "
+                             "`run`: SEQUENCE TARGET...")
     parser.add_argument("--baud", type=int, default=DEFAULT_BAUD, help="serial speed (115200)")
     parser.add_argument("--timeout", type=float, default=DEFAULT_TIMEOUT,
                         help="seconds to wait for each answer (%(default)s)")
@@ -45,6 +51,8 @@ def build_parser():
     parser.add_argument("--upper", action="store_true",
                         help="interactive: send what is typed in upper case")
     parser.add_argument("--junit", metavar="FILE", help="run: write a JUnit XML report")
+    parser.add_argument("--targets", metavar="FILE",
+                        help="multi-up run: more targets, one URL or device a line")
     return parser
 
 
@@ -94,19 +102,24 @@ def show_unsolicited(raw, lines, args, out):
     out.flush()
 
 
-def one_shot(station, commands, args):
-    station.on_unsolicited = lambda raw, lines: show_unsolicited(raw, lines, args, sys.stdout)
+def one_shot(phone, commands, args):
+    phone.station.on_unsolicited = (
+        lambda raw, lines: show_unsolicited(raw, lines, args, sys.stdout))
     every_ok = True
     for command in commands:
-        answer = station.ask(command)
+        try:
+            answer = phone.command(command)
+        except TimedOut as e:
+            answer = e.answer
         show_answer(answer, args, sys.stdout)
         every_ok &= answer.ok
     return EXIT_OK if every_ok else EXIT_FAILED
 
 
-def interactive(station, args):
+def interactive(phone, args):
     import readline  # noqa: F401  line editing and history for input()
 
+    station = phone.station
     lock = threading.Lock()
     stop = threading.Event()
 
@@ -145,35 +158,58 @@ def interactive(station, args):
     return EXIT_OK
 
 
-def run_sequence(station, path, args):
-    steps = sequence.parse(Path(path).read_text(), where=path)
-    outcomes = sequence.run(station, steps)
+def run_sequence(phone, path, args):
+    run = phone.run(path, junit_path=args.junit, report=print)
+    failed = sum(not o.passed for o in run.outcomes)
+    print(f"{len(run.outcomes) - failed} passed, {failed} failed, "
+          f"{len(run.steps) - len(run.outcomes)} not run")
+    if run.lost:
+        return EXIT_UNREACHABLE
+    return EXIT_OK if run.passed else EXIT_FAILED
+
+
+def multi_up(words, args, options):
+    """`run SEQUENCE TARGET...`: the sequence on every target at once."""
+    if not words:
+        raise ValueError("run takes a sequence file and targets")
+    targets = words[1:] + (multiup.read_targets(args.targets) if args.targets else [])
+    if not targets:
+        raise ValueError("run: no target (give them after the sequence or with --targets)")
+    steps = sequence.parse(Path(words[0]).read_text(), where=words[0])
+    runs = multiup.run_all(targets, steps, options)
     if args.junit:
-        sequence.write_junit(args.junit, outcomes, steps, Path(path).stem)
-    passed = len(outcomes) == len(steps) and all(o.passed for o in outcomes)
-    print(f"{sum(o.passed for o in outcomes)} passed, {sum(not o.passed for o in outcomes)} "
-          f"failed, {len(steps) - len(outcomes)} not run")
-    return EXIT_OK if passed else EXIT_FAILED
+        multiup.write_junit(args.junit, runs, steps)
+    print(multiup.summary(runs, len(steps)))
+    return multiup.exit_status(runs, len(steps))
 
 
-def push_file(station, local, name, args):
-    data = Path(local).read_bytes()
-    sent, verified = push_mod.push(station, data, name)
-    show_answer(sent, args, sys.stdout)
-    if verified is None:
-        print(f"push: the phone refused the file ({sent.result or 'no result word'})")
+def push_file(phone, local, name, args):
+    size = os.path.getsize(local)
+    bar = push_mod.Progress(size)
+    pushed = phone.push(local, name, progress=lambda done, total: bar.update(done, done == total))
+    show_answer(pushed.sent, args, sys.stdout)
+    if pushed.verified is None:
+        print(f"push: the phone refused the file ({pushed.sent.result or 'no result word'})")
         return EXIT_FAILED
-    show_answer(verified, args, sys.stdout)
-    if verified.ok:
-        print(f"push: /data/{name.lower()} stored, {len(data)} bytes, MD5 verified")
+    show_answer(pushed.verified, args, sys.stdout)
+    if pushed.ok:
+        print(f"push: /data/{name.lower()} stored, {size} bytes, MD5 verified")
         return EXIT_OK
-    print(f"push: MD5 check failed, the phone computed {verified.value() or 'nothing'}")
+    print(f"push: MD5 check failed, the phone computed {pushed.verified.value or 'nothing'}")
     return EXIT_FAILED
 
 
 def main(argv=None):
     args = build_parser().parse_intermixed_args(argv)
+    options = dict(baud=args.baud, connect_timeout=args.connect_timeout, idle=args.idle,
+                   timeout=args.timeout)
     words = args.words
+    if args.target == "run":
+        try:
+            return multi_up(words, args, options)
+        except (ValueError, OSError, sequence.SequenceError) as e:
+            print(f"atcid-station: {e}", file=sys.stderr)
+            return EXIT_UNREACHABLE
     action = words[0] if words and words[0] in ("run", "push") else None
     try:
         if action == "run" and len(words) != 2:
@@ -191,21 +227,14 @@ def main(argv=None):
         print(f"atcid-station: {e}", file=sys.stderr)
         return EXIT_UNREACHABLE
     try:
-        station = Station.connect(args.target, args.baud, args.connect_timeout,
-                                  idle=args.idle, timeout=args.timeout)
-    except LinkError as e:
+        with connect(args.target, **options) as phone:
+            if action == "run":
+                return run_sequence(phone, words[1], args)
+            if action == "push":
+                return push_file(phone, words[1], words[2], args)
+            if words:
+                return one_shot(phone, words, args)
+            return interactive(phone, args)
+    except StationError as e:
         print(f"atcid-station: {e}", file=sys.stderr)
         return EXIT_UNREACHABLE
-    try:
-        if action == "run":
-            return run_sequence(station, words[1], args)
-        if action == "push":
-            return push_file(station, words[1], words[2], args)
-        if words:
-            return one_shot(station, words, args)
-        return interactive(station, args)
-    except LinkError as e:
-        print(f"atcid-station: {e}", file=sys.stderr)
-        return EXIT_UNREACHABLE
-    finally:
-        station.close()

@@ -40,15 +40,15 @@ class Answer:
     def ok(self):
         return self.result == "OK"
 
+    @property
     def value(self):
-        """The quoted value of a query answer (`"QM0101"` → QM0101), else the first line."""
+        """The quoted value of a query answer (`\\r\\n"QM0101"\\r\\n` → QM0101) exactly as
+        sent, line ends inside the quotes included; else the body's first line."""
+        body = self.body.strip(" \r\n")
+        if len(body) >= 2 and body[0] == body[-1] == '"':
+            return body[1:-1]
         lines = self.lines
-        if not lines:
-            return ""
-        first = lines[0]
-        if len(first) >= 2 and first[0] == first[-1] == '"':
-            return first[1:-1]
-        return first
+        return lines[0] if lines else ""
 
 
 @dataclass

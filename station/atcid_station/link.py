@@ -6,13 +6,12 @@ import socket
 import threading
 import time
 
+from .errors import ConnectionLost, Unreachable
+
 DEFAULT_TCP_PORT = 6888
 DEFAULT_BAUD = 115200
 REFUSED_RETRY = 1.0
 
-
-class LinkError(Exception):
-    """The port could not be opened or was lost; the text says why for a person."""
 
 
 def parse_target(target):
@@ -20,25 +19,25 @@ def parse_target(target):
     if target.startswith("tcp://"):
         rest = target[len("tcp://"):].rstrip("/")
         if not rest:
-            raise LinkError(f"{target}: no host")
+            raise Unreachable(f"{target}: no host")
         host, port = rest, DEFAULT_TCP_PORT
         if rest.startswith("["):  # [::1]:6888
             close = rest.find("]")
             if close < 0:
-                raise LinkError(f"{target}: unclosed '['")
+                raise Unreachable(f"{target}: unclosed '['")
             host, tail = rest[1:close], rest[close + 1:]
             if tail:
                 if not tail.startswith(":"):
-                    raise LinkError(f"{target}: bad port")
+                    raise Unreachable(f"{target}: bad port")
                 port = tail[1:]
         elif rest.count(":") == 1:
             host, port = rest.split(":")
         try:
             port = int(port)
         except ValueError:
-            raise LinkError(f"{target}: bad port {port!r}") from None
+            raise Unreachable(f"{target}: bad port {port!r}") from None
         if not 0 < port < 65536:
-            raise LinkError(f"{target}: port {port} out of range")
+            raise Unreachable(f"{target}: port {port} out of range")
         return "tcp", host, port
     return "serial", target, None
 
@@ -84,7 +83,8 @@ class Link:
         try:
             self._write(data)
         except OSError as e:
-            raise LinkError(f"cannot send to the phone: {e.strerror or e}") from None
+            raise ConnectionLost(f"{self.name}: cannot send to the phone: {e.strerror or e}"
+                                 ) from None
 
     def close(self):
         self._close()
@@ -102,14 +102,16 @@ class TcpLink(Link):
         try:
             self.sock = self._connect(host, port, connect_timeout, started)
         except socket.timeout:
-            raise LinkError(f"{self.name}: connection timed out after "
-                            f"{time.monotonic() - started:.1f} s") from None
+            raise Unreachable(f"{self.name}: connection timed out after "
+                              f"{time.monotonic() - started:.1f} s") from None
         except ConnectionRefusedError:
-            raise LinkError(f"{self.name}: connection refused (is the phone serving TCP?)") from None
+            raise Unreachable(f"{self.name}: connection refused for "
+                              f"{time.monotonic() - started:.1f} s (is the phone serving TCP?)"
+                              ) from None
         except socket.gaierror as e:
-            raise LinkError(f"{self.name}: unknown host ({e.strerror})") from None
+            raise Unreachable(f"{self.name}: unknown host ({e.strerror})") from None
         except OSError as e:
-            raise LinkError(f"{self.name}: {e.strerror or e}") from None
+            raise Unreachable(f"{self.name}: {e.strerror or e}") from None
         self.sock.settimeout(None)
         self._start()
 
@@ -150,7 +152,7 @@ class SerialLink(Link):
         try:
             self.port = serial.Serial(device, baud, timeout=0.2, exclusive=True)
         except serial.SerialException as e:
-            raise LinkError(f"{device}: {_serial_reason(e)}") from None
+            raise Unreachable(f"{device}: {_serial_reason(e)}") from None
         self._stop = False
         self._start()
 

@@ -22,8 +22,9 @@ A step is a command line followed by options, split as a shell would (quotes gro
 import re
 import shlex
 import time
-from dataclasses import dataclass, field
-from xml.etree import ElementTree
+from dataclasses import dataclass
+
+from .errors import ConnectionLost, TimedOut
 
 _WORDS = {"ok": "OK", "error": "ERROR", "not implement": "Not Implement",
           "unknown": "UNKNOWN", "": "", "none": None}
@@ -59,6 +60,12 @@ class Outcome:
     message: str = ""
     answer: object = None
     command: str = ""
+    lost: bool = False  # the connection ended: the phone went away during this step
+
+    def __str__(self):
+        verdict = "PASS" if self.passed else "FAIL"
+        line = f"{verdict}  {self.command or self.step.name}  ({self.elapsed * 1000:.0f} ms)"
+        return line + (f"  {self.message}" if self.message else "")
 
 
 def parse(source, where="<sequence>"):
@@ -143,8 +150,11 @@ def _substitute(text, values, step):
     return re.sub(r"\$\{([A-Za-z_][A-Za-z0-9_]*)\}", one, text)
 
 
-def run(station, steps, report=print):
-    """Runs the steps in order; returns the outcomes of those that ran."""
+def run(phone, steps, report=print):
+    """Runs the steps on `phone` (an api.Phone) in order and hands each Outcome to `report` as
+    it is made (printed, it reads PASS or FAIL, the command, time and problem); returns the
+    outcomes of the steps that ran. A lost connection ends the run with an outcome marked
+    `lost`."""
     values, outcomes = {}, []
     for step in steps:
         started = time.monotonic()
@@ -152,25 +162,29 @@ def run(station, steps, report=print):
             time.sleep(step.wait)
             outcome = Outcome(step, True, time.monotonic() - started)
         else:
-            outcome = _run_command(station, step, values)
+            outcome = _run_command(phone, step, values)
         outcomes.append(outcome)
-        report(_describe(outcome))
-        if not outcome.passed and not step.go_on:
+        report(outcome)
+        if outcome.lost or (not outcome.passed and not step.go_on):
             break
     return outcomes
 
 
-def _run_command(station, step, values):
+def _run_command(phone, step, values):
     try:
         command = _substitute(step.command, values, step)
     except SequenceError as e:
         return Outcome(step, False, 0.0, str(e), command=step.command)
-    answer = station.ask(command, timeout=step.timeout, idle=step.idle)
+    started = time.monotonic()
+    try:
+        answer = phone.command(command, timeout=step.timeout, idle=step.idle)
+    except TimedOut as e:
+        return Outcome(step, False, e.answer.elapsed, str(e), e.answer, command)
+    except ConnectionLost as e:
+        return Outcome(step, False, time.monotonic() - started, str(e), None, command, lost=True)
     body = "\n".join(answer.lines)
     problems = []
-    if answer.timed_out:
-        problems.append("no answer before the time-out")
-    elif answer.result != step.expect:
+    if answer.result != step.expect:
         problems.append(f"result {_show(answer.result)}, expected {_show(step.expect)}")
     if step.body is not None and body != _substitute(step.body, values, step):
         problems.append(f"body {body!r} differs from {step.body!r}")
@@ -185,51 +199,9 @@ def _run_command(station, step, values):
             else:
                 values[name] = match.group(1) if match.groups() else match.group(0)
         else:
-            values[name] = answer.value()
+            values[name] = answer.value
     return Outcome(step, not problems, answer.elapsed, "; ".join(problems), answer, command)
 
 
 def _show(word):
     return "none" if word is None else repr(word)
-
-
-def _describe(outcome):
-    verdict = "PASS" if outcome.passed else "FAIL"
-    name = outcome.command or outcome.step.name
-    line = f"{verdict}  {name}  ({outcome.elapsed * 1000:.0f} ms)"
-    return line + (f"  {outcome.message}" if outcome.message else "")
-
-
-def junit(outcomes, total_steps, suite_name):
-    """A JUnit XML report: one test case per step; steps never run are reported skipped."""
-    failures = sum(not o.passed for o in outcomes)
-    skipped = total_steps - len(outcomes)
-    suite = ElementTree.Element("testsuite", name=suite_name, tests=str(total_steps),
-                                failures=str(failures), errors="0", skipped=str(skipped),
-                                time=f"{sum(o.elapsed for o in outcomes):.3f}")
-    for outcome in outcomes:
-        case = ElementTree.SubElement(
-            suite, "testcase", classname=suite_name,
-            name=f"{outcome.step.line_no}: {outcome.command or outcome.step.name}",
-            time=f"{outcome.elapsed:.3f}")
-        if not outcome.passed:
-            failure = ElementTree.SubElement(case, "failure", message=outcome.message)
-            if outcome.answer is not None:
-                failure.text = outcome.answer.raw.replace(b"\0", b"").decode("latin-1")
-    return suite
-
-
-def junit_steps_skipped(suite, steps, ran):
-    for step in steps[ran:]:
-        case = ElementTree.SubElement(suite, "testcase", classname=suite.get("name"),
-                                      name=f"{step.line_no}: {step.name}", time="0")
-        ElementTree.SubElement(case, "skipped", message="an earlier step failed")
-    return suite
-
-
-def write_junit(path, outcomes, steps, suite_name):
-    suite = junit_steps_skipped(junit(outcomes, len(steps), suite_name), steps, len(outcomes))
-    tree = ElementTree.ElementTree(ElementTree.Element("testsuites"))
-    tree.getroot().append(suite)
-    ElementTree.indent(tree)
-    tree.write(path, encoding="utf-8", xml_declaration=True)

@@ -3,7 +3,8 @@
 import time
 
 from .framing import Answer, decoder_for, split_lines, text
-from .link import LinkError, open_link
+from .errors import ConnectionLost
+from .link import open_link
 
 DEFAULT_TIMEOUT = 30.0
 DEFAULT_IDLE = 0.5
@@ -54,7 +55,8 @@ class Station:
                     raw = link.take(decoded.consumed)
                     break
                 if link.closed:
-                    raise LinkError(f"{link.name}: the phone closed the connection")
+                    raise ConnectionLost(f"{link.name}: the phone closed the connection "
+                                         f"{now - started:.1f} s after {command}")
                 if now >= deadline:
                     raw = link.take(len(link.buffer))
                     return Answer(command, body=text(raw), raw=raw, elapsed=now - started,

@@ -54,6 +54,19 @@ def test_decoders(kind, data, idle, expected):
     assert decoded.consumed == len(data)
 
 
+@pytest.mark.parametrize("body,value", [
+    ('\r\n"QM0305"\r\n', "QM0305"),
+    ('\r\n"4f2a91c3\n"\r\n', "4f2a91c3\n"),  # a file's line end stays inside the quotes
+    ('\r\n"front:A\r\nback:B"\r\n ', "front:A\r\nback:B"),
+    ('"1.25"', "1.25"),
+    ("350000000000014", "350000000000014"),  # a modem item's text, unquoted
+    ('\r\n"a"\r\nb', '"a"'),  # not one quoted value: the first line
+    ("", ""),
+])
+def test_answer_value(body, value):
+    assert framing.Answer("AT", body=body, result="OK").value == value
+
+
 def test_encoder_matches_the_phones_decoding():
     data = bytes(range(256))
     chars = push.encode(data)
