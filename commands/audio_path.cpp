@@ -1,6 +1,5 @@
 #include "commands/audio_path.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -8,6 +7,7 @@
 #include <unistd.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/audio.h"
@@ -90,15 +90,6 @@ void set_parameters(const char* text) {
   audio_set_parameters(text);
 }
 
-// Field `index` of the line split at ',' as strtok splits it (the command is field 0);
-// empty when there is none.
-std::string_view line_field(const char* cmdline, int index) {
-  std::string_view rest(cmdline);
-  std::string_view field;
-  for (int i = 0; i <= index; ++i) field = next_token(rest, ",");
-  return field.empty() ? std::string_view("") : field;  // never a null for a format
-}
-
 int atoi_field(std::string_view field) { return static_cast<int>(parse_long(field)); }
 
 // ---- AT+JVMT: receive, send and the shared sub-mic/headset echo loops
@@ -136,7 +127,7 @@ int run_loop_variant(const LoopVariant& variant, const char* cmdline) {
       ATCI_LOGD("**********aleady open AT+JVMT %s**********\r\n", variant.open_text);
       return RESULT_OK;
     }
-    const std::string_view gain = line_field(cmdline, 2);
+    const std::string_view gain = comma_field(cmdline, 2);
     const int volume = gain.empty() ? static_cast<int>(kDefaultVolume) : atoi_field(gain);
     if (start_test(*variant.test, static_cast<uint32_t>(volume)) != 0) {
       ATCI_LOGE("open %s test fail!", variant.test_name);
@@ -219,7 +210,7 @@ bool stop_ktv_loop(int& flag, const AudioTest& test, const char* stop_line, cons
 
 // The gain is the third field; a 0 is taken only when written with a leading '0'.
 bool ktv_gain(const char* cmdline, int* gain) {
-  const std::string_view field = line_field(cmdline, 2);
+  const std::string_view field = comma_field(cmdline, 2);
   if (field.empty()) {
     ATCI_LOGE("gain_multiples == NULL");
     return false;
@@ -271,9 +262,9 @@ constexpr HeadsetRoute kHeadsetToEarpieceWithGainRoute{
 
 // A gain field of the route family: present and decimal digits only.
 bool route_gain_field(const char* cmdline, int index, uint32_t* value) {
-  const std::string_view field = line_field(cmdline, index);
+  const std::string_view field = comma_field(cmdline, index);
   if (field.empty()) return false;
-  if (!std::all_of(field.begin(), field.end(), [](char c) { return c >= '0' && c <= '9'; })) {
+  if (!all_digits(field)) {
     ATCI_LOGE("====the gain multiples invalid:%.*s\r\n", static_cast<int>(field.size()),
               field.data());
     return false;
@@ -308,8 +299,7 @@ int run_headset_route(const HeadsetRoute& route, const char* cmdline, const char
     stop_test(*route.test);
     return RESULT_OK;
   }
-  ATCI_LOGE("========this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("========this at command invalid:%s====\r\n", cmdline);
 }
 
 // ---- AT+JVXL: loudspeaker playback, run by the audio library itself
@@ -398,23 +388,20 @@ int echo_handler(char* cmdline, int, char*) {
                                                : line_is(cmdline, variant.line);
     if (match) return run_loop_variant(variant, cmdline);
   }
-  ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
 }
 
 int mic_echo_handler(char* cmdline, int, char*) {
   for (const EchoVariant& variant : kEchoVariants)
     if (line_is(cmdline, variant.line)) return run_echo_variant(variant);
   if (!line_starts_with(cmdline, "AT+EALT=1") && !line_starts_with(cmdline, "AT+EALT=0"))
-    ATCI_LOGE("======this at command invalid:%s\r\n", cmdline);
+    return REJECT_LINE("======this at command invalid:%s\r\n", cmdline);
   return RESULT_ERROR;
 }
 
 int ktv_test_handler(char* cmdline, int, char*) {
-  if (line_is(cmdline, kKtvElectricStart) || line_is(cmdline, kKtvEchoStart)) {
-    ATCI_LOGE("Invalid AT command: %s\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (line_is(cmdline, kKtvElectricStart) || line_is(cmdline, kKtvEchoStart))
+    return REJECT_LINE("Invalid AT command: %s\r\n", cmdline);
   AudioTestFlags& flags = audio_test_flags;
   if (!stop_ktv_loop(flags.ktv_echo, kKtvEcho, "AT+JVKTV=0,2", "exit_ktv_echo_test_handler fail!",
                      cmdline) ||
@@ -444,8 +431,7 @@ int ktv_test_handler(char* cmdline, int, char*) {
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVKTV=0,2") || line_is(cmdline, "AT+JVKTV=0,1")) return RESULT_OK;
-  ATCI_LOGE("Invalid AT command: %s\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("Invalid AT command: %s\r\n", cmdline);
 }
 
 int dual_mic_to_headset_handler(char* cmdline, int, char*) {
@@ -499,8 +485,7 @@ int play_ring_handler(char* cmdline, int, char*) {
     playing = 0;
     return RESULT_OK;
   }
-  ATCI_LOGE("========this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("========this at command invalid:%s====\r\n", cmdline);
 }
 
 int ring_test_handler(char* cmdline, int, char*) {
@@ -508,7 +493,7 @@ int ring_test_handler(char* cmdline, int, char*) {
   char command[CMD_LINE_SIZE];
   std::snprintf(command, sizeof command, "%s", cmdline);
   command[std::strcspn(command, ",")] = '\0';
-  const std::string_view volume = line_field(cmdline, 1);
+  const std::string_view volume = comma_field(cmdline, 1);
   const int volume_len = static_cast<int>(volume.size());
   ATCI_LOGD("=======volume: %.*s\r\n", volume_len, volume.data());
   if (line_starts_with(command, "AT+JVMD=1")) {
@@ -524,17 +509,14 @@ int ring_test_handler(char* cmdline, int, char*) {
     sendBroadcastFromAtcid(kMediaPlayerReceiver, kMediaPlayerAction, kStopPlayback);
     return RESULT_OK;
   }
-  ATCI_LOGE("=====this at command invalid:%s\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("=====this at command invalid:%s\r\n", cmdline);
 }
 
 int play_media_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVMP=0")) return stop_media_playback();
-  if (!line_starts_with(cmdline, "AT+JVMP=1")) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
-  const std::string_view reference = line_field(cmdline, 1);
+  if (!line_starts_with(cmdline, "AT+JVMP=1"))
+    return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
+  const std::string_view reference = comma_field(cmdline, 1);
   for (const MediaDrive& drive : kMediaDrives)
     if (reference.find(drive.drive) != std::string_view::npos)
       return play_media_file(drive, reference);

@@ -1,7 +1,6 @@
 #include "commands/battery.h"
 
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
@@ -28,25 +27,6 @@ constexpr const char* kStatus = "/sys/class/power_supply/battery/status";
 constexpr const char* kAcCurrent = "/sys/class/power_supply/cms/current_ac_avg_now";
 constexpr const char* kChargeCurrent = "/data/data/com.ulda.engineermode/files/ChargeCurrent";
 constexpr const char* kAuthentic = "/sys/class/power_supply/bms/authentic";
-
-// One integer as "%d" reads it: blanks, a sign, digits. A file without one, or with one
-// beyond int, counts as unreadable.
-bool read_int_file(const char* path, int& value) {
-  char text[32];
-  if (read_file_head(path, text, sizeof text - 1) < 0) {
-    ATCI_LOGE("cannot open %s", path);
-    return false;
-  }
-  std::string_view rest(text);
-  rest.remove_prefix(std::min(rest.find_first_not_of(" \t\r\n\v\f"), rest.size()));
-  if (!rest.empty() && rest.front() == '+') rest.remove_prefix(1);
-  const auto [end, error] = std::from_chars(rest.data(), rest.data() + rest.size(), value);
-  if (error != std::errc() || end == rest.data()) {
-    ATCI_LOGE("no integer in %s", path);
-    return false;
-  }
-  return true;
-}
 
 // Each integer goes through single precision, then is divided in double precision.
 double scaled(int value, double divisor) { return static_cast<float>(value) / divisor; }

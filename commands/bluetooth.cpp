@@ -1,12 +1,11 @@
 #include "commands/bluetooth.h"
 
-#include <cctype>
 #include <cstdio>
 #include <cstring>
 #include <string_view>
 
 #include "commands/command_util.h"
-#include "commands/radio_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -55,11 +54,8 @@ int write_address(const char* cmdline) {
   uint8_t b[kAddressBytes];
   for (size_t i = 0; i < kAddressBytes; ++i)
     b[i] = static_cast<uint8_t>(nibble(address[2 * i]) << 4 | nibble(address[2 * i + 1]));
-  char command[CMD_LINE_SIZE];
   // The tool takes the bytes in reverse order.
-  std::snprintf(command, sizeof command, "btnvtool -b %02X.%02X.%02X.%02X.%02X.%02X", b[5], b[4],
-                b[3], b[2], b[1], b[0]);
-  run_tool(command);
+  run_sh_command("btnvtool -b %02X.%02X.%02X.%02X.%02X.%02X", b[5], b[4], b[3], b[2], b[1], b[0]);
   return RESULT_OK;
 }
 
@@ -106,12 +102,7 @@ int read_scan(char* response) {
   return RESULT_OK;
 }
 
-bool is_channel(std::string_view channel) {
-  if (channel.empty() || channel.size() > 3) return false;
-  for (char c : channel)
-    if (!std::isdigit(static_cast<unsigned char>(c))) return false;
-  return true;
-}
+bool is_channel(std::string_view channel) { return channel.size() <= 3 && all_digits(channel); }
 
 }  // namespace
 
@@ -153,7 +144,7 @@ int bt_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+EMBT=4")) return dut_check();
   if (line_starts_with(cmdline, "AT+EMBT=0,BT")) return write_address(cmdline);
   if (line_is(cmdline, "AT+EMBT=1")) {
-    run_tool("bdt entrydut");
+    run_sh_command("bdt entrydut");
     return dut_check();
   }
   if (line_starts_with(cmdline, "AT+EMBT=1")) {
@@ -167,14 +158,11 @@ int bt_handler(char* cmdline, int, char* response) {
       ATCI_LOGE("========bt_channel is not a channel\n");
       return RESULT_ERROR;
     }
-    char command[CMD_LINE_SIZE];
-    std::snprintf(command, sizeof command, "bdt txcontinuous %.*s",
-                  static_cast<int>(channel.size()), channel.data());
-    run_tool(command);
+    run_sh_command("bdt txcontinuous %.*s", static_cast<int>(channel.size()), channel.data());
     return dut_check();
   }
   if (line_is(cmdline, "AT+EMBT=2")) {
-    run_tool("bdt exitdut");
+    run_sh_command("bdt exitdut");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+EMBT=6")) {

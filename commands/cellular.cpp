@@ -11,7 +11,8 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
-#include "commands/radio_util.h"
+#include "commands/shell.h"
+#include "commands/device_info.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"
@@ -30,14 +31,6 @@ void log_cmdline(const char* caller, const char* cmdline) {
   atci_log(LOG_LVL_DEBUG, __LINE__, caller, "===========cmdline %s\r\n", cmdline);
 }
 
-// A field as a writable, terminated copy of at most N - 1 characters.
-template <size_t N>
-void copy_field(char (&out)[N], std::string_view field) {
-  const size_t n = field.size() < N - 1 ? field.size() : N - 1;
-  std::memcpy(out, field.data(), n);
-  out[n] = '\0';
-}
-
 // A broadcast switch of two whole-line variants: "=1" sends `on`, "=0" sends `off`.
 struct Switch {
   const char* on_line;
@@ -51,10 +44,8 @@ int broadcast_switch(const Switch& s, const char* cmdline) {
   const char* extras = line_is(cmdline, s.on_line)    ? s.on_extras
                        : line_is(cmdline, s.off_line) ? s.off_extras
                                                       : nullptr;
-  if (extras == nullptr) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (extras == nullptr)
+    return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
   sendBroadcastFromAtcid(nullptr, s.action, extras);
   return RESULT_OK;
 }
@@ -71,25 +62,14 @@ bool int_request(IntRequest request, int32_t value, QmiResult& result) {
   return rc == 0 && result.flag == 0;
 }
 
-constexpr std::string_view kPresentSimStates[] = {
-    "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
-    "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
-};
-
+// Slot 2 is the second field of "gsm.sim.state" as strtok finds it (",READY" has none), or
+// the property of its own.
 bool sim2_present() {
   char states[PROPERTY_VALUE_MAX];
   property_get("gsm.sim.state", states, " ");
-  std::string_view sim2(states);
-  if (sim2.find(',') != std::string_view::npos) {
-    next_token(sim2, ",");
-    sim2 = next_token(sim2, ",");
-  } else {
-    property_get("gsm.sim.state.2", states, " ");
-    sim2 = states;
-  }
-  for (std::string_view present : kPresentSimStates)
-    if (sim2 == present) return true;
-  return false;
+  if (std::strchr(states, ',') != nullptr) return sim_state_present(comma_field(states, 1));
+  property_get("gsm.sim.state.2", states, " ");
+  return sim_state_present(states);
 }
 
 // Modem NV items behind the MEID and WLAN MAC commands.
@@ -125,8 +105,7 @@ int nv_read(const NvCommand& nv, char* response) {
 }
 
 int nv_write(const NvCommand& nv, const char* cmdline) {
-  CommaFields fields(cmdline);
-  const std::string_view field = fields.next();
+  const std::string_view field = comma_field(cmdline, 1);
   if (field.empty()) {
     ATCI_LOGE("========The wlan addr is NULL====");
     return RESULT_ERROR;
@@ -181,8 +160,7 @@ int plan_mode_test_handler(char* cmdline, int, char*) {
       sendBroadcastFromAtcid(nullptr, "android.intent.action.AT_AIRPLANE_MODE", "--ez state false");
     return RESULT_OK;
   }
-  ATCI_LOGE("====this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("====this at command invalid:%s====\r\n", cmdline);
 }
 
 int status_bar_3g_handler(char* cmdline, int, char*) {
@@ -231,16 +209,13 @@ int fast_search_test_handler(char* cmdline, int, char*) {
     sendBroadcastFromAtcid(nullptr, kFastSearchNet, "--es status 0");
     return RESULT_OK;
   }
-  ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
 }
 
 int radio_type_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
-  if (!line_is(cmdline, "AT+JVRADIO=0")) {
-    ATCI_LOGE("=======this at command invalid:%s*\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (!line_is(cmdline, "AT+JVRADIO=0"))
+    return REJECT_LINE("=======this at command invalid:%s*\r\n", cmdline);
   struct RadioType {
     const char* abbr;
     const char* bands;
@@ -274,14 +249,14 @@ int set_sim2_status_handler(char* cmdline, int, char* response) {
     int32_t value;
   };
   static constexpr Sim2Switch kSwitches[] = {
-      {"AT+JVSIMT=0", "/system/bin/sh -c \"touch /data/sim2_status\"",
+      {"AT+JVSIMT=0", "touch /data/sim2_status",
        "Touch /data/sim2_status fail!\r\n", 0},
-      {"AT+JVSIMT=1", "/system/bin/sh -c \"rm /data/sim2_status \"",
+      {"AT+JVSIMT=1", "rm /data/sim2_status ",
        "rm /data/sim2_status fail!\r\n", 1},
   };
   for (const Sim2Switch& s : kSwitches) {
     if (!line_is(cmdline, s.line)) continue;
-    if (run_shell(s.command) < 0) {
+    if (run_sh_command("%s", s.command) < 0) {
       ATCI_LOGE("%s", s.failure);
       return RESULT_ERROR;
     }
@@ -297,8 +272,7 @@ int primary_or_diversity_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
   QmiResult answer;
   if (line_starts_with(cmdline, "AT+JVZFTX=1")) {
-    CommaFields fields(cmdline);
-    const std::string_view n = fields.next();
+    const std::string_view n = comma_field(cmdline, 1);
     if (n.empty()) return RESULT_ERROR;
     return result_of(int_request(mutuallySwitchForPrimaryAndDiversity,
                                  static_cast<int32_t>(parse_long(n)), answer));
@@ -410,12 +384,13 @@ int nfc_tag_handler(char* cmdline, int, char* response) {
     ATCI_LOGE("==open %s fail\r\n", kTagId);
     return RESULT_ERROR;
   }
-  unsigned char tag[20];
-  const ssize_t n = ::read(fd.get(), tag, sizeof tag);
+  char tag[21];
+  const ssize_t n = read_head(fd.get(), tag, sizeof tag - 1);
   ATCI_LOGD("==read %s:%d\r\n", kTagId, static_cast<int>(n));
   if (n <= 3) return RESULT_ERROR;
   char hex[2 * sizeof tag + 1] = {};
-  for (ssize_t i = 0; i < n; ++i) std::snprintf(hex + 2 * i, 3, "%02x", tag[i]);
+  for (ssize_t i = 0; i < n; ++i)
+    std::snprintf(hex + 2 * i, 3, "%02x", static_cast<unsigned char>(tag[i]));
   return answer_quoted(response, hex);
 }
 
@@ -428,18 +403,13 @@ int conn_wifi_handler(char* cmdline, int, char*) {
   constexpr std::string_view kName = "AT+JVCONNWIFI";
   const std::string_view line(cmdline);
   if (!line_starts_with(cmdline, "AT+JVCONNWIFI") ||
-      (line.size() > kName.size() && line[kName.size()] != '=')) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
+      (line.size() > kName.size() && line[kName.size()] != '='))
+    return REJECT_LINE("==command invalid:%s", cmdline);
   std::string_view rest = line.substr(std::min(line.find('='), line.size()));
   if (!rest.empty()) rest.remove_prefix(1);
   const std::string_view ssid_field = next_token(rest, ",");
   const std::string_view pwd_field = next_token(rest, ",");
-  if (ssid_field.empty()) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
+  if (ssid_field.empty()) return REJECT_LINE("==command invalid:%s", cmdline);
   char ssid[CMD_LINE_SIZE];
   char pwd[CMD_LINE_SIZE];
   copy_field(ssid, ssid_field);
@@ -453,6 +423,6 @@ int conn_wifi_handler(char* cmdline, int, char*) {
   ::sleep(50);
   sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 4");
   platform_sync();
-  ::usleep(150 * 1000);
+  sleep_ms(150);
   platform_restart();
 }

@@ -51,7 +51,7 @@ constexpr FileQuery kRearCamera{"AT+JVCCMID=0", "sys/ccm/RearSensorId", kFirstLi
 bool read_query_value(const FileQuery& query, char* value) {
   static_assert(kFirstLineSize <= kMaxQueryRead && 200 <= kMaxQueryRead);
   if (query.extract == Extract::kHead) return read_file_value(query.path, value, query.limit);
-  if (read_first_line(query.path, value, query.limit) != 0) {
+  if (read_first_line(query.path, value, query.limit) <= 0) {
     ATCI_LOGE("cannot read %s", query.path);
     return false;
   }
@@ -76,18 +76,6 @@ bool read_small_file(const char* path, char (&buf)[kSmallFileSize + 1]) {
     return false;
   }
   return true;
-}
-
-// The SIM states that mean a card is in the slot.
-constexpr std::string_view kPresentSimStates[] = {
-    "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
-    "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
-};
-
-bool sim_state_present(std::string_view state) {
-  for (std::string_view present : kPresentSimStates)
-    if (state == present) return true;
-  return false;
 }
 
 // Dual-SIM phones report both slots in "gsm.sim.state" as "slot1,slot2"; others have a
@@ -115,6 +103,16 @@ void read_sim_slots(SimSlots& sim, const char* fallback) {
 
 }  // namespace
 
+bool sim_state_present(std::string_view state) {
+  static constexpr std::string_view kPresentSimStates[] = {
+      "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
+      "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
+  };
+  for (std::string_view present : kPresentSimStates)
+    if (state == present) return true;
+  return false;
+}
+
 int is_product_model(const char* model) {
   char value[PROPERTY_VALUE_MAX];
   property_get("ro.pemu.product.model", value, "");
@@ -131,7 +129,7 @@ int jvmodel_handler(char* cmdline, int, char* response) {
 int jvram_handler(char* cmdline, int, char* response) {
   if (!line_starts_with(cmdline, "AT+JVRAM=0")) return REJECT_COMMAND_LINE(cmdline);
   char line[kFirstLineSize];
-  if (read_first_line("/proc/meminfo", line, sizeof line) != 0) {
+  if (read_first_line("/proc/meminfo", line, sizeof line) <= 0) {
     ATCI_LOGE("cannot read /proc/meminfo");
     return RESULT_ERROR;
   }
@@ -185,7 +183,7 @@ int jvseboot_handler(char* cmdline, int, char*) {
 int jvbbtype_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVBBTYPE=0")) return REJECT_COMMAND_LINE(cmdline);
   char line[128];
-  if (read_first_line(kMppsValue, line, sizeof line) != 0) {
+  if (read_first_line(kMppsValue, line, sizeof line) <= 0) {
     ATCI_LOGE("cannot read %s", kMppsValue);
     return RESULT_ERROR;
   }

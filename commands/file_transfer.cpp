@@ -15,6 +15,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"
@@ -145,9 +146,7 @@ int receive_file(const char* path, long long length) {
     return RESULT_ERROR;
   }
   if (UniqueFd dir(dev_open("/data", O_RDONLY | O_DIRECTORY)); dir.ok()) ::fsync(dir.get());
-  char chmod[kPathSize + 32];
-  std::snprintf(chmod, sizeof chmod, "/system/bin/sh -c \"chmod 777 %s\"", path);
-  run_shell(chmod);
+  run_sh_command("chmod 777 %s", path);
   return RESULT_OK;
 }
 
@@ -172,14 +171,11 @@ int verify_file(const char* path, std::string_view expected, char* response) {
 
 int jvfile_handler(char* cmdline, int, char* response) {
   const bool receive = line_starts_with(cmdline, "AT+JVFILE=1");
-  if (!receive && !line_starts_with(cmdline, "AT+JVFILE=2")) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  const std::string_view name = next_token(rest, ",");
-  const std::string_view second = next_token(rest, ",");
+  if (!receive && !line_starts_with(cmdline, "AT+JVFILE=2"))
+    return REJECT_LINE("==command invalid:%s", cmdline);
+  CommaFields fields(cmdline);
+  const std::string_view name = fields.next();
+  const std::string_view second = fields.next();
   if (name.empty() || second.empty()) return RESULT_ERROR;
   ATCI_LOGD("file_name=%.*s, %s=%.*s", static_cast<int>(name.size()), name.data(),
             receive ? "buff_len" : "md5", static_cast<int>(second.size()), second.data());

@@ -11,6 +11,7 @@
 
 #include "commands/battery.h"
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
@@ -111,7 +112,7 @@ int route_fm_audio(const char* command) {
     return RESULT_ERROR;
   }
   device.reset();
-  run_shell(command);
+  run_sh_command("%s", command);
   return RESULT_OK;
 }
 
@@ -150,15 +151,12 @@ int gps_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVGPS=3")) return gps_open_handler(3);
   if (line_is(cmdline, "AT+JVGPS=0")) return gps_close_handler();
   if (line_is(cmdline, "AT+JVGPS=2") && gps_open) return gps_stream_handler();
-  ATCI_LOGE("====this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("====this at command invalid:%s====\r\n", cmdline);
 }
 
 int locate_access_on_handler(char* cmdline, int, char*) {
-  if (!line_is(cmdline, "AT+JVDW=1")) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (!line_is(cmdline, "AT+JVDW=1"))
+    return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
   sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 3");
   // The phone records its track meanwhile; the station waits for the answer.
   ::sleep(80);
@@ -177,7 +175,7 @@ int fm_test_handler(char* cmdline, int, char* response) {
     if (fm_tuner_fd >= 0) ::close(fm_tuner_fd);
     fm_tuner_fd = -1;
     return route_fm_audio(
-        "/system/bin/sh -c \"echo 6 1 1 > /sys/devices/virtual/misc/msm_snd/device\"");
+        "echo 6 1 1 > /sys/devices/virtual/misc/msm_snd/device");
   }
   if (line_is(cmdline, "AT+JVFM=2")) {
     if (fm_tuner_fd < 0) return RESULT_ERROR;
@@ -195,8 +193,7 @@ int fm_test_handler(char* cmdline, int, char* response) {
     if (fm_tuner_fd >= 0) return RESULT_OK;
     fm_tuner_fd = dev_open("/dev/radio0", O_RDWR | O_CLOEXEC);
     return route_fm_audio(
-        "/system/bin/sh -c \"echo 26 0 1 > /sys/devices/virtual/misc/msm_snd/device\"");
+        "echo 26 0 1 > /sys/devices/virtual/misc/msm_snd/device");
   }
-  ATCI_LOGE("=====this at command invalid:%s\r\n", cmdline);
-  return RESULT_ERROR;
+  return REJECT_LINE("=====this at command invalid:%s\r\n", cmdline);
 }

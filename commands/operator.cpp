@@ -1,6 +1,5 @@
 #include "commands/operator.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -222,16 +221,13 @@ int write_region_code(const char* flag) {
 
 int optr_flag_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVOPTR=1")) {
-    std::string_view rest(cmdline);
-    next_token(rest, ",");
-    const std::string_view flag = next_token(rest, ",");
+    const std::string_view flag = comma_field(cmdline, 1);
     if (flag.empty()) {
       ATCI_LOGE("optr flag is NULL");
       return RESULT_ERROR;
     }
     char text[CMD_LINE_SIZE];
-    flag.copy(text, sizeof text - 1);
-    text[std::min(flag.size(), sizeof text - 1)] = '\0';
+    copy_field(text, flag);
     return set_optr_flag(text, response);
   }
   if (line_is(cmdline, "AT+JVOPTR=0")) {

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/storage.h"
 #include "core/command.h"
 #include "core/log.h"
@@ -29,18 +30,16 @@ constexpr const char* kUpdateReceiver = "com.ulda.engineermode/.UpdateSWReceiver
 constexpr const char* kUpdateAction = "android.flashOP.UpdateSW";
 constexpr size_t kRecoveryTextMax = 255;
 
-void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
-
 // The phone is about to go away: the station hears OK now or never. The update commands
 // answer with a blank line before the word, the power commands without.
 void early_answer_line(const char* cmdline) { write_early_answer(cmdline, "OK", true); }
 
 void ensure_recovery_dir() {
-  if (dev_access(kRecoveryDir, F_OK) != 0) run_shell("/system/bin/sh -c \"mkdir /cache/recovery\"");
+  if (dev_access(kRecoveryDir, F_OK) != 0) run_sh_command("mkdir /cache/recovery");
 }
 
 // Recovery reads the command file at its next start.
-void reboot_recovery() { run_shell("/system/bin/sh -c \"reboot recovery\""); }
+void reboot_recovery() { run_sh_command("reboot recovery"); }
 
 // Writes all of `data` over the start of the command file; the tail of a longer earlier
 // command stays.
@@ -90,9 +89,7 @@ int master_clear() {
 }
 
 int install_operator_package(const char* cmdline, char* response) {
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  const std::string_view name = next_token(rest, ",");
+  const std::string_view name = comma_field(cmdline, 1);
   if (name.empty()) return RESULT_ERROR;
   char path[CMD_LINE_SIZE + 32];
   std::snprintf(path, sizeof path, "/storage/sdcard0/oem_%.*s.zip", static_cast<int>(name.size()),
