@@ -157,8 +157,7 @@ int smart_speaker_Amplifier_calibrate_handler(char* cmdline, int, char* response
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+ZNGF=3")) return result_of(finish_calibration(family_of_model()) == 0);
-  ATCI_LOGE("===========sent command fial =====\r\n");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("===========sent command fial =====\r\n");
 }
 
 int i2c_device_test_handler(char* cmdline, int, char* response) {

@@ -23,10 +23,8 @@ constexpr const char* kScanFile = "/data/user/0/com.ulda.engineermode/bt_device"
 int dut_check() {
   char state[PROPERTY_VALUE_MAX];
   property_get("bluetooth.bdt.pemudut", state, "");
-  if (std::strstr(state, "true") == nullptr) {
-    ATCI_LOGE("===is not enter BT ftm Test mode \r\n");
-    return RESULT_ERROR;
-  }
+  if (std::strstr(state, "true") == nullptr)
+    return LOGGED_ERROR("===is not enter BT ftm Test mode \r\n");
   return RESULT_OK;
 }
 
@@ -42,15 +40,10 @@ int write_address(const char* cmdline) {
   CommaFields fields(cmdline);
   fields.next();  // "BT"
   const std::string_view address = fields.next();
-  if (address.empty()) {
-    ATCI_LOGE("========bt_addr is NULL\n");
-    return RESULT_ERROR;
-  }
-  if (address.size() < 2 * kAddressBytes) {
-    ATCI_LOGE("========bt_addr too short: %.*s\n", static_cast<int>(address.size()),
-              address.data());
-    return RESULT_ERROR;
-  }
+  if (address.empty()) return LOGGED_ERROR("========bt_addr is NULL\n");
+  if (address.size() < 2 * kAddressBytes)
+    return LOGGED_ERROR("========bt_addr too short: %.*s\n", static_cast<int>(address.size()),
+                        address.data());
   uint8_t b[kAddressBytes];
   for (size_t i = 0; i < kAddressBytes; ++i)
     b[i] = static_cast<uint8_t>(nibble(address[2 * i]) << 4 | nibble(address[2 * i + 1]));
@@ -62,20 +55,15 @@ int write_address(const char* cmdline) {
 int read_address(char* response) {
   bt_nv_item items[BT_NV_ITEMS] = {};
   const int count = bt_nv_read(items);
-  if (count < 0) {
-    ATCI_LOGE("BT-NV-CMD: Read from NV persist failed\n");
-    return RESULT_ERROR;
-  }
+  if (count < 0) return LOGGED_ERROR("BT-NV-CMD: Read from NV persist failed\n");
   ATCI_LOGD("BT-NV-CMD: numitems = %d\n", count);
   const int searched = count < BT_NV_ITEMS ? count : BT_NV_ITEMS;
   for (int i = 0; i < searched; ++i) {
     const bt_nv_item& item = items[i];
     if (item.id != kAddressItem) continue;
     ATCI_LOGD("BT-NV-CMD: Found NV item at '%d'\n", i);
-    if (!item.value_read || item.length < kAddressBytes) {
-      ATCI_LOGE("BT-NV-CMD: address item holds %d bytes\n", item.length);
-      return RESULT_ERROR;
-    }
+    if (!item.value_read || item.length < kAddressBytes)
+      return LOGGED_ERROR("BT-NV-CMD: address item holds %d bytes\n", item.length);
     const uint8_t* v = item.value;
     ATCI_LOGD("BT-NV-CMD: NV_READ_F: BD Addr: %02x %02x %02x %02x %02x %02x\n", v[0], v[1], v[2],
               v[3], v[4], v[5]);
@@ -83,16 +71,12 @@ int read_address(char* response) {
                   v[3], v[2], v[1], v[0]);
     return RESULT_OK;
   }
-  ATCI_LOGE("BT-NV-CMD: no address item among the first %d\n", searched);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("BT-NV-CMD: no address item among the first %d\n", searched);
 }
 
 int read_scan(char* response) {
   UniqueFile file(dev_fopen(kScanFile, "r"));
-  if (!file) {
-    ATCI_LOGE("fail to open %s\r\n", kScanFile);
-    return RESULT_ERROR;
-  }
+  if (!file) return LOGGED_ERROR("fail to open %s\r\n", kScanFile);
   char line[256];
   for (int n = 0; n < 5 && std::fgets(line, sizeof line, file.get()) != nullptr; ++n) {
     body_append(response, n == 0 ? "\r\n\"" : ",\r\n");
@@ -150,14 +134,8 @@ int bt_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+EMBT=1")) {
     CommaFields fields(cmdline);
     const std::string_view channel = fields.next();
-    if (channel.empty()) {
-      ATCI_LOGE("========bt_channel is NULL\n");
-      return RESULT_ERROR;
-    }
-    if (!is_channel(channel)) {
-      ATCI_LOGE("========bt_channel is not a channel\n");
-      return RESULT_ERROR;
-    }
+    if (channel.empty()) return LOGGED_ERROR("========bt_channel is NULL\n");
+    if (!is_channel(channel)) return LOGGED_ERROR("========bt_channel is not a channel\n");
     run_sh_command("bdt txcontinuous %.*s", static_cast<int>(channel.size()), channel.data());
     return dut_check();
   }

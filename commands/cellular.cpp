@@ -45,7 +45,7 @@ int broadcast_switch(const Switch& s, const char* cmdline) {
                        : line_is(cmdline, s.off_line) ? s.off_extras
                                                       : nullptr;
   if (extras == nullptr)
-    return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
+    return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
   sendBroadcastFromAtcid(nullptr, s.action, extras);
   return RESULT_OK;
 }
@@ -91,14 +91,9 @@ int nv_read(const NvCommand& nv, char* response) {
   wait.transp_err = -1;
   const int rc = qmi_kro_read_nv_msg_ex(&req, sizeof req, QMI_KRO_READ_NV_INFO_RESP_MSG_V01, &resp,
                                         sizeof resp, &wait);
-  if (rc != 0 || wait.msg_id != QMI_KRO_READ_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0) {
-    ATCI_LOGE("ret=%d, msg_id=%d, status=%d", rc, wait.msg_id, wait.transp_err);
-    return RESULT_ERROR;
-  }
-  if (resp.buffer_valid != 1) {
-    ATCI_LOGE("get_nv_rsp.buffer_valid:%d", resp.buffer_valid);
-    return RESULT_ERROR;
-  }
+  if (rc != 0 || wait.msg_id != QMI_KRO_READ_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0)
+    return LOGGED_ERROR("ret=%d, msg_id=%d, status=%d", rc, wait.msg_id, wait.transp_err);
+  if (resp.buffer_valid != 1) return LOGGED_ERROR("get_nv_rsp.buffer_valid:%d", resp.buffer_valid);
   std::snprintf(response, RESPONSE_SIZE, "%.*s", static_cast<int>(sizeof resp.buffer),
                 resp.buffer);
   return RESULT_OK;
@@ -106,10 +101,7 @@ int nv_read(const NvCommand& nv, char* response) {
 
 int nv_write(const NvCommand& nv, const char* cmdline) {
   const std::string_view field = comma_field(cmdline, 1);
-  if (field.empty()) {
-    ATCI_LOGE("========The wlan addr is NULL====");
-    return RESULT_ERROR;
-  }
+  if (field.empty()) return LOGGED_ERROR("========The wlan addr is NULL====");
   char value[CMD_LINE_SIZE];
   copy_field(value, field);
   substring(value);
@@ -126,8 +118,7 @@ int nv_write(const NvCommand& nv, const char* cmdline) {
   if (rc != 0 || wait.msg_id != QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0 ||
       resp.result != 0) {
     ATCI_LOGE("ret=%d, msg_id=%d, status=%d\n", rc, wait.msg_id, wait.transp_err);
-    ATCI_LOGE("error=%d, result=%d\n", resp.error, resp.result);
-    return RESULT_ERROR;
+    return LOGGED_ERROR("error=%d, result=%d\n", resp.error, resp.result);
   }
   return RESULT_OK;
 }
@@ -160,7 +151,7 @@ int plan_mode_test_handler(char* cmdline, int, char*) {
       sendBroadcastFromAtcid(nullptr, "android.intent.action.AT_AIRPLANE_MODE", "--ez state false");
     return RESULT_OK;
   }
-  return REJECT_LINE("====this at command invalid:%s====\r\n", cmdline);
+  return LOGGED_ERROR("====this at command invalid:%s====\r\n", cmdline);
 }
 
 int status_bar_3g_handler(char* cmdline, int, char*) {
@@ -194,10 +185,8 @@ int fast_search_test_handler(char* cmdline, int, char*) {
     const std::string_view sim = fields.next();
     const std::string_view act = fields.next();
     const std::string_view channel = fields.next();
-    if (sim.empty() || act.empty() || channel.empty()) {
-      ATCI_LOGE("===========sim OR act OR channel is NULL\r\n");
-      return RESULT_ERROR;
-    }
+    if (sim.empty() || act.empty() || channel.empty())
+      return LOGGED_ERROR("===========sim OR act OR channel is NULL\r\n");
     char extras[256];
     std::snprintf(extras, sizeof extras, "--es status 1 --es sim %.*s --es act %.*s --es arfcn %.*s",
                   static_cast<int>(sim.size()), sim.data(), static_cast<int>(act.size()),
@@ -209,13 +198,13 @@ int fast_search_test_handler(char* cmdline, int, char*) {
     sendBroadcastFromAtcid(nullptr, kFastSearchNet, "--es status 0");
     return RESULT_OK;
   }
-  return REJECT_LINE("**********this at command invalid:%s***********\r\n", cmdline);
+  return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
 }
 
 int radio_type_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
   if (!line_is(cmdline, "AT+JVRADIO=0"))
-    return REJECT_LINE("=======this at command invalid:%s*\r\n", cmdline);
+    return LOGGED_ERROR("=======this at command invalid:%s*\r\n", cmdline);
   struct RadioType {
     const char* abbr;
     const char* bands;
@@ -256,10 +245,7 @@ int set_sim2_status_handler(char* cmdline, int, char* response) {
   };
   for (const Sim2Switch& s : kSwitches) {
     if (!line_is(cmdline, s.line)) continue;
-    if (run_sh_command("%s", s.command) < 0) {
-      ATCI_LOGE("%s", s.failure);
-      return RESULT_ERROR;
-    }
+    if (run_sh_command("%s", s.command) < 0) return LOGGED_ERROR("%s", s.failure);
     QmiResult ignored;
     int_request(qmi_switch_sim2_status, s.value, ignored);
     return RESULT_OK;
@@ -318,10 +304,8 @@ int virtual_sim_handler(char* cmdline, int, char* response) {
     property_set("persist.sys.tel.autoanswer.ms", "5");
   }
   QmiResult answer;
-  if (!int_request(qmi_set_status, v->code, answer)) {
-    ATCI_LOGE("======send qmi msg fail\n");
-    return RESULT_ERROR;
-  }
+  if (!int_request(qmi_set_status, v->code, answer))
+    return LOGGED_ERROR("======send qmi msg fail\n");
   if (v->code == 14) {
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db");
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db-journal");
@@ -380,10 +364,7 @@ int nfc_tag_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVNFC=2")) return RESULT_ERROR;
   constexpr const char* kTagId = "/data/data/com.android.nfc/files/TagId";
   UniqueFd fd(dev_open(kTagId, O_RDONLY | O_CLOEXEC));
-  if (!fd.ok()) {
-    ATCI_LOGE("==open %s fail\r\n", kTagId);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("==open %s fail\r\n", kTagId);
   char tag[21];
   const ssize_t n = read_head(fd.get(), tag, sizeof tag - 1);
   ATCI_LOGD("==read %s:%d\r\n", kTagId, static_cast<int>(n));
@@ -404,12 +385,12 @@ int conn_wifi_handler(char* cmdline, int, char*) {
   const std::string_view line(cmdline);
   if (!line_starts_with(cmdline, "AT+JVCONNWIFI") ||
       (line.size() > kName.size() && line[kName.size()] != '='))
-    return REJECT_LINE("==command invalid:%s", cmdline);
+    return LOGGED_ERROR("==command invalid:%s", cmdline);
   std::string_view rest = line.substr(std::min(line.find('='), line.size()));
   if (!rest.empty()) rest.remove_prefix(1);
   const std::string_view ssid_field = next_token(rest, ",");
   const std::string_view pwd_field = next_token(rest, ",");
-  if (ssid_field.empty()) return REJECT_LINE("==command invalid:%s", cmdline);
+  if (ssid_field.empty()) return LOGGED_ERROR("==command invalid:%s", cmdline);
   char ssid[CMD_LINE_SIZE];
   char pwd[CMD_LINE_SIZE];
   copy_field(ssid, ssid_field);

@@ -30,10 +30,8 @@ int name_number(const std::string_view (&names)[N], std::string_view field) {
 
 int read_system_time(char* response) {
   char line[101];
-  if (sh_first_line("date", kTimeScratch, line, sizeof line) < 0) {
-    ATCI_LOGE("/data/systemtime open file failed\n");
-    return RESULT_ERROR;
-  }
+  if (sh_first_line("date", kTimeScratch, line, sizeof line) < 0)
+    return LOGGED_ERROR("/data/systemtime open file failed\n");
   ATCI_LOGD("buf=%s\n", line);
   std::string_view rest(line);
   std::string_view fields[6];
@@ -43,10 +41,7 @@ int read_system_time(char* response) {
   std::string_view year = fields[5];
   ATCI_LOGD("========YEAR1: %.*s\n", static_cast<int>(zone.size()), zone.data());
   year = year.substr(0, year.find_first_of("\r\n"));
-  if (year.empty()) {
-    ATCI_LOGE("date output too short: %s", line);
-    return RESULT_ERROR;
-  }
+  if (year.empty()) return LOGGED_ERROR("date output too short: %s", line);
   char date_text[128];
   std::snprintf(date_text, sizeof date_text, "%.*s-%d-%.*s", static_cast<int>(year.size()),
                 year.data(), name_number(kMonthNames, month), static_cast<int>(day.size()),
@@ -133,7 +128,7 @@ int get_system_time_handler(char* cmdline, int, char* response) {
   ATCI_LOGD("===========cmdline %s\r\n", cmdline);
   if (line_is(cmdline, "AT+JVSJ=0")) return read_system_time(response);
   if (line_starts_with(cmdline, "AT+JVSJ=1")) return set_system_time(cmdline);
-  return REJECT_LINE("=====this at command invalid:%s\r\n", cmdline);
+  return LOGGED_ERROR("=====this at command invalid:%s\r\n", cmdline);
 }
 
 int set_language_handler(char* cmdline, int, char* response) {
@@ -174,5 +169,5 @@ int set_default_language_handler(char* cmdline, int, char*) {
     broadcast_language(wanted.language, wanted.region);
     return RESULT_OK;
   }
-  return REJECT_LINE("=======this at command invalid\r\n");
+  return LOGGED_ERROR("=======this at command invalid\r\n");
 }

@@ -14,10 +14,11 @@ bool line_is(const char* line, const char* variant);
 // Only the variant's length is compared, so trailing text is accepted.
 bool line_starts_with(const char* line, const char* variant);
 
-// A line of the family that matches none of its variants: logged at the caller in the family's
-// own words, then failed. REJECT_COMMAND_LINE is the plain wording.
-#define REJECT_LINE(format, ...) (ATCI_LOGE(format __VA_OPT__(, ) __VA_ARGS__), RESULT_ERROR)
-#define REJECT_COMMAND_LINE(cmdline) REJECT_LINE("this at command invalid: %s", (cmdline))
+// A failure logged at the caller's line and function, then answered ERROR:
+// `return LOGGED_ERROR("cannot open %s", path);`. A line of the family that matches none of
+// its variants is such a failure, in the family's own words or REJECT_COMMAND_LINE's plain ones.
+#define LOGGED_ERROR(format, ...) (ATCI_LOGE(format __VA_OPT__(, ) __VA_ARGS__), RESULT_ERROR)
+#define REJECT_COMMAND_LINE(cmdline) LOGGED_ERROR("this at command invalid: %s", (cmdline))
 
 inline int result_of(bool pass) { return pass ? RESULT_OK : RESULT_ERROR; }
 

@@ -29,16 +29,11 @@ int set_colour_type(const char* cmdline) {
   if (!all_digits(field)) return REJECT_COMMAND_LINE(cmdline);
   unsigned long type = 0;
   if (std::from_chars(field.data(), field.data() + field.size(), type).ec != std::errc() ||
-      type > 1) {
-    ATCI_LOGE("just surport 0 & 1");
-    return RESULT_ERROR;
-  }
+      type > 1)
+    return LOGGED_ERROR("just surport 0 & 1");
   {
     UniqueFd fd(dev_open(kColourCalibration, O_WRONLY | O_TRUNC));
-    if (!fd.ok()) {
-      ATCI_LOGE("cannot open %s", kColourCalibration);
-      return RESULT_ERROR;
-    }
+    if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kColourCalibration);
     if (!write_full(fd.get(), field.data(), field.size()))
       ATCI_LOGE("cannot write %s", kColourCalibration);
   }
@@ -106,10 +101,7 @@ int eslp_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+ESLP=0")) return REJECT_COMMAND_LINE(cmdline);
   constexpr const char* kMaxFreq = "/sys/devices/system/cpu/cpu0/cpufreq/scaling_max_freq";
   UniqueFd fd(dev_open(kMaxFreq, O_WRONLY | O_CREAT | O_TRUNC, 0666));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kMaxFreq);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kMaxFreq);
   return result_of(write_full(fd.get(), "800000", 6));
 }
 

@@ -45,11 +45,9 @@ int answer_record_int(const char* caller, char* response, int32_t ulda_nvram::*f
 int store_digits(const char* caller, const char* cmdline, int32_t ulda_nvram::*field) {
   const std::string_view param = comma_field(cmdline, 1);
   int32_t value = 0;
-  if (!parse_digits(param, value)) {
-    ATCI_LOGE("====this at wall paper id invalid:%.*s", static_cast<int>(param.size()),
-              param.data());
-    return RESULT_ERROR;
-  }
+  if (!parse_digits(param, value))
+    return LOGGED_ERROR("====this at wall paper id invalid:%.*s", static_cast<int>(param.size()),
+                        param.data());
   return update_ulda_nvram(caller, [&](ulda_nvram& r) {
     r.*field = value;
     ATCI_LOGD("=======set ulda_nvram field: %d", value);
@@ -147,10 +145,8 @@ int jv3g_handler(char* cmdline, int, char* response) {
   property_get("sys.pemu.3g.nomal", value, "");
   ATCI_LOGD("============getprop:%s,ulda_nvram.nomal_3g:%d", value, record.nomal_3g);
   // An unset property reads as 0, as atoi reads it.
-  if (parse_long(value) != record.nomal_3g) {
-    ATCI_LOGE("========getprop != ulda_nvram.nomal_3g");
-    return RESULT_ERROR;
-  }
+  if (parse_long(value) != record.nomal_3g)
+    return LOGGED_ERROR("========getprop != ulda_nvram.nomal_3g");
   return answer_quoted_int(response, record.nomal_3g);
 }
 
@@ -230,10 +226,8 @@ int jvefs_handler(char* cmdline, int, char*) {
 int jvrdnv_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVRDNV=0")) return REJECT_COMMAND_LINE(cmdline);
   ulda_nvram record;
-  if (get_ULDA_NV_item(&record) != 0) {
-    ATCI_LOGE("===system_init_flag_on_handler read nvram fail");
-    return RESULT_ERROR;
-  }
+  if (get_ULDA_NV_item(&record) != 0)
+    return LOGGED_ERROR("===system_init_flag_on_handler read nvram fail");
   return answer_quoted_int(response, record.is_jvsn_ok);
 }
 

@@ -136,10 +136,7 @@ int receive_file(const char* path, long long length) {
   ATCI_LOGD("write file %s", path);
   dev_unlink(FILE_TRANSFER_PARTIAL);
   UniqueFd file(dev_open(FILE_TRANSFER_PARTIAL, O_RDWR | O_CREAT | O_TRUNC | O_NOFOLLOW, 0666));
-  if (!file.ok()) {
-    ATCI_LOGE("create file error:%s ", std::strerror(errno));
-    return RESULT_ERROR;
-  }
+  if (!file.ok()) return LOGGED_ERROR("create file error:%s ", std::strerror(errno));
   if (!receive_content(file.get(), length) || ::fdatasync(file.get()) != 0 ||
       dev_rename(FILE_TRANSFER_PARTIAL, path) != 0) {
     dev_unlink(FILE_TRANSFER_PARTIAL);
@@ -163,8 +160,7 @@ int verify_file(const char* path, std::string_view expected, char* response) {
   for (size_t i = 0; i < sizeof digest; ++i) std::snprintf(hex + 2 * i, 3, "%02x", digest[i]);
   std::snprintf(response, RESPONSE_SIZE, "\"%s\"", hex);
   if (expected.size() >= 32 && strncasecmp(hex, expected.data(), 32) == 0) return RESULT_OK;
-  ATCI_LOGE("==verify error");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("==verify error");
 }
 
 }  // namespace
@@ -172,7 +168,7 @@ int verify_file(const char* path, std::string_view expected, char* response) {
 int jvfile_handler(char* cmdline, int, char* response) {
   const bool receive = line_starts_with(cmdline, "AT+JVFILE=1");
   if (!receive && !line_starts_with(cmdline, "AT+JVFILE=2"))
-    return REJECT_LINE("==command invalid:%s", cmdline);
+    return LOGGED_ERROR("==command invalid:%s", cmdline);
   CommaFields fields(cmdline);
   const std::string_view name = fields.next();
   const std::string_view second = fields.next();
@@ -180,10 +176,8 @@ int jvfile_handler(char* cmdline, int, char* response) {
   ATCI_LOGD("file_name=%.*s, %s=%.*s", static_cast<int>(name.size()), name.data(),
             receive ? "buff_len" : "md5", static_cast<int>(second.size()), second.data());
   char path[kPathSize];
-  if (!transfer_path(name, path)) {
-    ATCI_LOGE("refused file name: %.*s", static_cast<int>(name.size()), name.data());
-    return RESULT_ERROR;
-  }
+  if (!transfer_path(name, path))
+    return LOGGED_ERROR("refused file name: %.*s", static_cast<int>(name.size()), name.data());
   if (!receive) return verify_file(path, second, response);
   long long length = 0;
   if (!parse_length(second, length)) return RESULT_ERROR;

@@ -109,10 +109,8 @@ int nv_item_command(const NvItemCommand& command, char* cmdline, char* response)
   if (line_is(cmdline, command.read_line)) return read_nv_item(command.item, 0, response);
   if (!line_starts_with(cmdline, command.write_prefix)) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 1, command.value_name, value)) {
-    ATCI_LOGE("%s", command.missing_log);
-    return RESULT_ERROR;
-  }
+  if (!normalised_field(cmdline, 1, command.value_name, value))
+    return LOGGED_ERROR("%s", command.missing_log);
   return write_nv_item(command.item, 0, value, command.request_name);
 }
 
@@ -236,10 +234,8 @@ int imei_and_pcb_code_on_handler(char* cmdline, int, char* response) {
   const bool barcode = !imei && !imei_with_options && line_starts_with(cmdline, "AT+EGMR=1,5");
   if (!imei && !imei_with_options && !barcode) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 2, "barcode", value)) {
-    ATCI_LOGE("========Barcode is NULL\n");
-    return RESULT_ERROR;
-  }
+  if (!normalised_field(cmdline, 2, "barcode", value))
+    return LOGGED_ERROR("========Barcode is NULL\n");
   const uint32_t item = barcode ? kBarcodeItem : kImeiItem;
   if (write_nv_item(item, imei_with_options ? 1 : 0, value, "data_req_for_put_nv") != RESULT_OK)
     return RESULT_ERROR;
@@ -274,5 +270,5 @@ int property_set_handler(char* cmdline, int, char* response) {
     property_get(name, response, "NULL");
     return RESULT_OK;
   }
-  return REJECT_LINE("invalid command\r\n");
+  return LOGGED_ERROR("invalid command\r\n");
 }

@@ -144,10 +144,7 @@ int display_on() {
   const bool oled = is_any_model(kOledModels);
   if (!oled && !is_product_model("QM0304A")) return RESULT_OK;
   UniqueFd fd(dev_open(kFrameBuffer, O_RDWR));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kFrameBuffer);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kFrameBuffer);
   g_display_fd = std::move(fd);
   if (oled) {
     run_sh_command("chmod 666 /sys/lcm/oled_pixelon");
@@ -159,10 +156,7 @@ int display_on() {
 
 int display_off() {
   UniqueFd fd(dev_open(kFrameBuffer, O_RDWR));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kFrameBuffer);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kFrameBuffer);
   if (platform_fb_blank(fd.get(), PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
   return RESULT_OK;
 }

@@ -63,17 +63,12 @@ int master_clear() {
   ensure_recovery_dir();
   {
     UniqueFd file(dev_open(kRecoveryCommand, O_WRONLY | O_CREAT | O_TRUNC, 0666));
-    if (!file.ok()) {
-      ATCI_LOGE("fail to open /cache/recovery/command");
-      return RESULT_ERROR;
-    }
+    if (!file.ok()) return LOGGED_ERROR("fail to open /cache/recovery/command");
     // Recovery reads the terminating NUL too.
     static constexpr char kWipe[] = "--wipe_data";
     static_assert(sizeof kWipe == 12);
-    if (::write(file.get(), kWipe, sizeof kWipe) != static_cast<ssize_t>(sizeof kWipe)) {
-      ATCI_LOGE("fail to write /cache/recovery/command");
-      return RESULT_ERROR;
-    }
+    if (::write(file.get(), kWipe, sizeof kWipe) != static_cast<ssize_t>(sizeof kWipe))
+      return LOGGED_ERROR("fail to write /cache/recovery/command");
   }
   const int status = update_ulda_nvram("master_clear", [](ulda_nvram& r) {
     ATCI_LOGD("=======set ulda_nvram.master_clear_flag: %d,%d", r.adb_flag, 13);
@@ -152,10 +147,8 @@ int update_apps_only(const char* cmdline, char* response) {
   if (!app_version_matches(response)) return RESULT_ERROR;
   ATCI_LOGD("update apps only");
   static constexpr char kUpdateApp[] = "--update_app";
-  if (!overwrite_recovery_command(kUpdateApp, sizeof kUpdateApp - 1)) {
-    ATCI_LOGE("======write the file fail");
-    return RESULT_ERROR;
-  }
+  if (!overwrite_recovery_command(kUpdateApp, sizeof kUpdateApp - 1))
+    return LOGGED_ERROR("======write the file fail");
   if (set_restore_flag() != 1 || clear_sdcard("update_app") != 1) return RESULT_ERROR;
   early_answer_line(cmdline);
   sleep_ms(3000);

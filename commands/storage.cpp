@@ -293,10 +293,7 @@ int tfst_handler(char* cmdline, int, char* response) {
   int length = read_first_line("/mnt/sdcard/.sdcard_version", version, sizeof version);
   if (length < 0)
     length = read_first_line("/storage/sdcard1/.sdcard_version", version, sizeof version);
-  if (length <= 0) {
-    ATCI_LOGE("no memory card version file");
-    return RESULT_ERROR;
-  }
+  if (length <= 0) return LOGGED_ERROR("no memory card version file");
   return answer_quoted(response, version);
 }
 
@@ -306,10 +303,7 @@ int jvsd_handler(char* cmdline, int, char*) {
   char mounts[4097];
   const ssize_t count = read_file_head("/sdcard/mount.txt", mounts, sizeof mounts - 1);
   dev_unlink("/sdcard/mount.txt");
-  if (count < 1) {
-    ATCI_LOGE("cannot read /sdcard/mount.txt");
-    return RESULT_ERROR;
-  }
+  if (count < 1) return LOGGED_ERROR("cannot read /sdcard/mount.txt");
   char emulate[PROPERTY_VALUE_MAX];
   property_get("persist.sys.primary.emulate", emulate, "0");
   const std::string_view text(mounts);

@@ -139,10 +139,7 @@ int jvadb_handler(char* cmdline, int, char* response) {
     return result_of(closed);
   }
   if (line_is(line, "AT+JVADB=0,1")) {
-    if (close_adb(line) != 1) {
-      ATCI_LOGE("===== close adb fail");
-      return RESULT_ERROR;
-    }
+    if (close_adb(line) != 1) return LOGGED_ERROR("===== close adb fail");
     ATCI_LOGD("===== close adb success");
     sendBroadcastFromAtcid(nullptr, "kro.intent.action.AT_SHUT_DOWN", nullptr);
     return RESULT_OK;

@@ -211,10 +211,8 @@ int wlan_transmit(const char* cmdline, bool wide) {
   const std::string_view rate = fields.next();
   const std::string_view power = fields.next();
   const std::string_view bonding = wide ? fields.next() : std::string_view();
-  if (channel.empty() || rate.empty() || power.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (channel.empty() || rate.empty() || power.empty())
+    return LOGGED_ERROR("Parameters incomplete.");
   power_is_off = false;
   int power_value = 0;
   const FieldText power_text(power);
@@ -255,10 +253,7 @@ int wlan_receive(const char* cmdline, bool wide) {
   const std::string_view channel = fields.next();
   const std::string_view rate = fields.next();
   const std::string_view bonding = wide ? fields.next() : std::string_view();
-  if (channel.empty() || rate.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (channel.empty() || rate.empty()) return LOGGED_ERROR("Parameters incomplete.");
   RfSetup setup;
   if (!rf_setup(channel, rate, bonding, wide, setup)) return RESULT_ERROR;
   run_sh_command("iwpriv wlan0 ftm 1");
@@ -303,19 +298,12 @@ int wlan_set_power(const char* cmdline) {
   CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
   const std::string_view power = fields.next();
-  if (protocol.empty()) {
-    ATCI_LOGE("protocol null.");
-    return RESULT_ERROR;
-  }
+  if (protocol.empty()) return LOGGED_ERROR("protocol null.");
   const char* rate_cmd = protocol_rate(protocol);
-  if (rate_cmd == nullptr) {
-    ATCI_LOGE("protocl wrong.");
-    return RESULT_ERROR;
-  }
-  if (power.empty()) {
-    ATCI_LOGE("Parameters incomplete %c.", std::tolower(static_cast<unsigned char>(protocol[0])));
-    return RESULT_ERROR;
-  }
+  if (rate_cmd == nullptr) return LOGGED_ERROR("protocl wrong.");
+  if (power.empty())
+    return LOGGED_ERROR("Parameters incomplete %c.",
+                        std::tolower(static_cast<unsigned char>(protocol[0])));
   const double value = std::atof(FieldText(power).text);
   if (!(value >= 5 && value <= 20)) {
     ATCI_LOGE("power=%d,not in [5,20]", static_cast<int>(value));
@@ -336,15 +324,9 @@ int wlan_set_power(const char* cmdline) {
 int wlan_get_power(const char* cmdline, char* response) {
   CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
-  if (protocol.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (protocol.empty()) return LOGGED_ERROR("Parameters incomplete.");
   const char* rate_cmd = protocol_rate(protocol);
-  if (rate_cmd == nullptr) {
-    ATCI_LOGE("temp solution,20120311 just support BGN protocol");
-    return RESULT_ERROR;
-  }
+  if (rate_cmd == nullptr) return LOGGED_ERROR("temp solution,20120311 just support BGN protocol");
   run_sh_command("iwpriv wlan0 tx 0");
   run_sh_command("iwpriv wlan0 ftm 0");
   run_sh_command("iwpriv wlan0 ftm 1");
@@ -361,10 +343,7 @@ int wlan_set_config(const char* cmdline) {
   run_sh_command("ptt_socket_app");
   CommaFields fields(cmdline);
   const std::string_view value = fields.next();
-  if (value.empty()) {
-    ATCI_LOGE("Parameters configItem1 incomplete.");
-    return RESULT_ERROR;
-  }
+  if (value.empty()) return LOGGED_ERROR("Parameters configItem1 incomplete.");
   run_sh_command("iwpriv wlan0 set_configitem %d", std::atoi(FieldText(value).text));
   return RESULT_OK;
 }
@@ -428,5 +407,5 @@ int wifi_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVWLAN=GP")) return wlan_get_power(cmdline, response);
   if (line_starts_with(cmdline, "AT+JVWLAN=SC")) return wlan_set_config(cmdline);
   if (line_starts_with(cmdline, "AT+JVWLAN=GC")) return wlan_get_config(response);
-  return REJECT_LINE("=====this at command invalid=====");
+  return LOGGED_ERROR("=====this at command invalid=====");
 }
