@@ -11,6 +11,7 @@
 
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
+#include "services/ulda_nvram.h"
 
 bool line_is(const char* line, const char* variant) { return strcasecmp(line, variant) == 0; }
 
@@ -26,6 +27,12 @@ int answer_quoted(char* response, const char* value) {
 int answer_quoted_int(char* response, int value) {
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%d\"\r\n", value);
   return RESULT_OK;
+}
+
+int answer_record_int(const char* caller, char* response, int32_t ulda_nvram::*field) {
+  ulda_nvram record;
+  if (read_ulda_nvram(caller, record) != RESULT_OK) return RESULT_ERROR;
+  return answer_quoted_int(response, record.*field);
 }
 
 bool body_append(char* response, std::string_view piece) {

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <string_view>
 #include <sys/types.h>
 
@@ -25,6 +26,11 @@ inline int result_of(bool pass) { return pass ? RESULT_OK : RESULT_ERROR; }
 // The query body "\r\n\"value\"\r\n". Both return RESULT_OK.
 int answer_quoted(char* response, const char* value);
 int answer_quoted_int(char* response, int value);
+
+struct ulda_nvram;
+// The query answering one field of the factory record, quoted; `caller` names the read in
+// the log. RESULT_ERROR when the record cannot be read.
+int answer_record_int(const char* caller, char* response, int32_t ulda_nvram::*field);
 
 // Room for a body that grows line by line: the framed answer (echo, body, result word) must
 // stay within the response size.

@@ -49,9 +49,9 @@ int set_colour_type(const char* cmdline) {
 // The unit goes to sleep: the answer leaves first, since the port goes quiet after it.
 int sleep_now(int fb) {
   write_early_answer("AT+EQSB=0", "OK", true);
-  run_sh_command("echo \"255\" > /sys/class/leds/lcd-backlight/brightness");
-  run_sh_command("echo \"0\" > /sys/class/leds/lcd-backlight/brightness");
-  run_sh_command("echo 1 > /sys/touchscreen/suspend_cmd");
+  run_sh_commands({"echo \"255\" > /sys/class/leds/lcd-backlight/brightness",
+                   "echo \"0\" > /sys/class/leds/lcd-backlight/brightness",
+                   "echo 1 > /sys/touchscreen/suspend_cmd"});
   if (platform_fb_blank(fb, PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
   run_sh_command("echo \"mem\" > /sys/power/autosleep");
   return RESULT_DONE;
@@ -77,11 +77,8 @@ int lcmt_handler(char* cmdline, int, char*) {
 
 int jvlcd_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVLCD=1")) return set_colour_type(cmdline);
-  if (line_is(cmdline, "AT+JVLCD=0")) {
-    ulda_nvram record;
-    if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-    return answer_quoted_int(response, record.lcm_color_type);
-  }
+  if (line_is(cmdline, "AT+JVLCD=0"))
+    return answer_record_int(__func__, response, &ulda_nvram::lcm_color_type);
   return REJECT_COMMAND_LINE(cmdline);
 }
 

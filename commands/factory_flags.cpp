@@ -35,12 +35,6 @@ bool parse_mask(std::string_view text, uint32_t& mask) {
   return ec == std::errc{} && end == text.data() + text.size();
 }
 
-int answer_record_int(const char* caller, char* response, int32_t ulda_nvram::*field) {
-  ulda_nvram record;
-  if (read_ulda_nvram(caller, record) != RESULT_OK) return RESULT_ERROR;
-  return answer_quoted_int(response, record.*field);
-}
-
 // "=1,<digits>" stores the number in the field.
 int store_digits(const char* caller, const char* cmdline, int32_t ulda_nvram::*field) {
   const std::string_view param = comma_field(cmdline, 1);

@@ -147,9 +147,8 @@ int display_on() {
   if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kFrameBuffer);
   g_display_fd = std::move(fd);
   if (oled) {
-    run_sh_command("chmod 666 /sys/lcm/oled_pixelon");
-    run_sh_command("echo \"1\" > /sys/lcm/oled_pixelon");
-    run_sh_command("chmod 444 /sys/lcm/oled_pixelon");
+    run_sh_commands({"chmod 666 /sys/lcm/oled_pixelon", "echo \"1\" > /sys/lcm/oled_pixelon",
+                     "chmod 444 /sys/lcm/oled_pixelon"});
   }
   return RESULT_OK;
 }
@@ -312,8 +311,8 @@ int jvsp_handler(char* cmdline, int, char*) {
 
 int jvbs_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVBS=1")) {
-    run_sh_command("touch /data/data/com.ulda.engineermode/keepScreenOn");
-    run_sh_command("chmod 0666 /data/data/com.ulda.engineermode/keepScreenOn");
+    run_sh_commands({"touch /data/data/com.ulda.engineermode/keepScreenOn",
+                     "chmod 0666 /data/data/com.ulda.engineermode/keepScreenOn"});
     if (is_sp == 0) keep_screen_on_broadcast("-e status 3");
     return RESULT_OK;
   }

@@ -228,9 +228,7 @@ int jvreboot_handler(char* cmdline, int, char*) {
 int jvrt_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+JVRT=1")) return master_clear();
   if (!line_is(cmdline, "AT+JVRT=0")) return REJECT_COMMAND_LINE(cmdline);
-  ulda_nvram record;
-  if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-  return answer_quoted_int(response, record.master_clear_flag);
+  return answer_record_int(__func__, response, &ulda_nvram::master_clear_flag);
 }
 
 int jvrtall_handler(char* cmdline, int, char* response) {

@@ -51,6 +51,10 @@ int run_sh_command(const char* format, ...) {
   return run_shell(command);
 }
 
+void run_sh_commands(std::initializer_list<const char*> texts) {
+  for (const char* text : texts) run_sh_command("%s", text);
+}
+
 bool shell_succeeded(int status) {
   return status != -1 && WIFEXITED(status) && WEXITSTATUS(status) == 0;
 }

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <initializer_list>
 
 // Runs a command text exactly as given through the platform shell; returns the wait status.
 int run_shell(const char* command);
@@ -18,6 +19,9 @@ bool sh_command_text(char (&command)[SH_COMMAND_SIZE], const char* format, ...)
 // Runs /system/bin/sh -c "TEXT" for a printf-style TEXT and returns system()'s raw result; -1,
 // and logged, when the command would not fit.
 int run_sh_command(const char* format, ...) __attribute__((format(printf, 1, 2)));
+
+// Runs each text in turn as run_sh_command("%s", text) does; the results are not wanted.
+void run_sh_commands(std::initializer_list<const char*> texts);
 
 // The shell ran the command and it exited with status 0.
 bool shell_succeeded(int status);

@@ -394,11 +394,8 @@ int jvfn_handler(char* cmdline, int, char* response) {
 }
 
 int jvsdcali_handler(char* cmdline, int, char* response) {
-  if (line_is(cmdline, "AT+JVSDCALI=0")) {
-    ulda_nvram record;
-    if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-    return answer_quoted_int(response, record.sdcard_cali_flag);
-  }
+  if (line_is(cmdline, "AT+JVSDCALI=0"))
+    return answer_record_int(__func__, response, &ulda_nvram::sdcard_cali_flag);
   if (!line_is(cmdline, "AT+JVSDCALI=1")) return REJECT_COMMAND_LINE(cmdline);
   return update_ulda_nvram(__func__, [](ulda_nvram& record) {
     struct statfs before {};

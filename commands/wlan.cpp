@@ -187,11 +187,8 @@ int wlan_init() {
     sendBroadcastFromAtcid(nullptr, "kro.intent.action.KEEP_CREEN_ON", "-e status 2");
     ATCI_LOGD("end JVWLAN=1 KEEP_CREEN_ON 2");
   }
-  run_sh_command("rmmod cfg80211");
-  run_sh_command("rmmod wlan");
-  run_sh_command("insmod /system/lib/modules/cfg80211.ko");
-  run_sh_command("echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode");
-  run_sh_command("%s", kLoadWlan);
+  run_sh_commands({"rmmod cfg80211", "rmmod wlan", "insmod /system/lib/modules/cfg80211.ko",
+                   "echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode", kLoadWlan});
   ::sleep(2);
   if (check_driver_loaded("wlan") == 0) {
     ATCI_LOGE("wlan modules unloaded, try to load again!");
@@ -228,15 +225,11 @@ int wlan_transmit(const char* cmdline, bool wide) {
     run_sh_command("%s", kLoadWlan);
     ::usleep(200);
   }
-  run_sh_command("iwpriv wlan0 tx 0");
-  run_sh_command("iwpriv wlan0 ftm 0");
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0"});
   if (!power_is_off) power_value = static_cast<int>(std::atof(power_text.text) * 100);
   if (!wide) sleep_ms(200);
-  run_sh_command("iwpriv wlan0 ftm 1");
-  run_sh_command("%s", setup.channel_cmd);
-  run_sh_command("iwpriv wlan0 ena_chain 2");
-  run_sh_command("%s", setup.rate_cmd);
-  run_sh_command("iwpriv wlan0 pwr_cntl_mode 2");
+  run_sh_commands({"iwpriv wlan0 ftm 1", setup.channel_cmd, "iwpriv wlan0 ena_chain 2",
+                   setup.rate_cmd, "iwpriv wlan0 pwr_cntl_mode 2"});
   if (power_is_off) {
     char value[kCommandSize];
     if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
@@ -258,12 +251,9 @@ int wlan_receive(const char* cmdline, bool wide) {
   if (!rf_setup(channel, rate, bonding, wide, setup)) return RESULT_ERROR;
   run_sh_command("iwpriv wlan0 ftm 1");
   if (wide) ::sleep(1);
-  run_sh_command("%s", setup.channel_cmd);
-  run_sh_command("iwpriv wlan0 ena_chain 1");
-  run_sh_command("iwpriv wlan0 pwr_cntl_mode 2");
+  run_sh_commands({setup.channel_cmd, "iwpriv wlan0 ena_chain 1", "iwpriv wlan0 pwr_cntl_mode 2"});
   ATCI_LOGD("rate_cmd=%s, !!BUT AT NOT SET!!", setup.rate_cmd);
-  run_sh_command("iwpriv wlan0 clr_rxpktcnt 1");
-  run_sh_command("iwpriv wlan0 rx 1");
+  run_sh_commands({"iwpriv wlan0 clr_rxpktcnt 1", "iwpriv wlan0 rx 1"});
   return RESULT_OK;
 }
 
@@ -310,13 +300,9 @@ int wlan_set_power(const char* cmdline) {
     if (matches("N", protocol)) ATCI_LOGE("AT+JVWLAN=SP,N,power");
     return RESULT_ERROR;
   }
-  run_sh_command("iwpriv wlan0 tx 0");
-  run_sh_command("iwpriv wlan0 ftm 0");
-  run_sh_command("iwpriv wlan0 ftm 1");
-  run_sh_command("iwpriv wlan0 set_channel 1");
-  run_sh_command("iwpriv wlan0 ena_chain 2");
-  run_sh_command("%s", rate_cmd);
-  run_sh_command("iwpriv wlan0 pwr_cntl_mode 2");
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0", "iwpriv wlan0 ftm 1",
+                   "iwpriv wlan0 set_channel 1", "iwpriv wlan0 ena_chain 2", rate_cmd,
+                   "iwpriv wlan0 pwr_cntl_mode 2"});
   run_sh_command("iwpriv wlan0 set_chpower %d", static_cast<int>(value * 100));
   return RESULT_OK;
 }
@@ -327,11 +313,8 @@ int wlan_get_power(const char* cmdline, char* response) {
   if (protocol.empty()) return LOGGED_ERROR("Parameters incomplete.");
   const char* rate_cmd = protocol_rate(protocol);
   if (rate_cmd == nullptr) return LOGGED_ERROR("temp solution,20120311 just support BGN protocol");
-  run_sh_command("iwpriv wlan0 tx 0");
-  run_sh_command("iwpriv wlan0 ftm 0");
-  run_sh_command("iwpriv wlan0 ftm 1");
-  run_sh_command("iwpriv wlan0 set_channel 1");
-  run_sh_command("%s", rate_cmd);
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0", "iwpriv wlan0 ftm 1",
+                   "iwpriv wlan0 set_channel 1", rate_cmd});
   char value[kCommandSize];
   if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%f\"\r\n", std::atof(value) / 100);
@@ -386,16 +369,14 @@ int wifi_handler(char* cmdline, int, char* response) {
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=8")) {
-    run_sh_command("iwpriv wlan0 rx 0");
-    run_sh_command("iwpriv wlan0 ftm 0");
+    run_sh_commands({"iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0"});
     ATCI_LOGD("wifi_stop_rx called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=9")) {
-    for (const char* command :
-         {"iwpriv wlan0 tx 0", "iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0", "rmmod cfg80211",
-          "rmmod wlan", "echo 0 > /sys/module/wcnsscore/parameters/wlan_eng_mode"})
-      run_sh_command("%s", command);
+    run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0",
+                     "rmmod cfg80211", "rmmod wlan",
+                     "echo 0 > /sys/module/wcnsscore/parameters/wlan_eng_mode"});
     ATCI_LOGD("wifi_deinit called");
     return RESULT_OK;
   }
