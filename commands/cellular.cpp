@@ -11,8 +11,8 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
-#include "commands/shell.h"
 #include "commands/device_info.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"

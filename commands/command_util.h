@@ -1,5 +1,6 @@
-// Shapes that recur across command families: matching a line against a variant, the quoted
-// answers, and the small reads of kernel and scratch files.
+// Shapes that recur across command families: matching a line against a variant, its comma
+// fields, the logged failure, the quoted answers, and the small reads of kernel and scratch
+// files. The shell has its own header, commands/shell.h.
 #pragma once
 
 #include <cstddef>
@@ -96,4 +97,5 @@ bool all_digits(std::string_view text);
 // 0 when there are none.
 long parse_long(std::string_view text);
 
+// A pause of whole milliseconds.
 void sleep_ms(unsigned ms);

@@ -10,8 +10,8 @@
 #include <unistd.h>
 
 #include "commands/command_util.h"
-#include "commands/shell.h"
 #include "commands/device_info.h"
+#include "commands/shell.h"
 #include "commands/worker.h"
 #include "core/transport.h"
 #include "platform/platform.h"
