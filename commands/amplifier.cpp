@@ -11,6 +11,7 @@
 
 #include "commands/command_util.h"
 #include "commands/device_info.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -54,12 +55,12 @@ const AmplifierFamily& family_of_model() {
 
 int start_calibration(const AmplifierFamily& family) {
   AMP_LOG("%s", family.calibrate);
-  int result = run_sh_command(family.calibrate);
+  int result = run_sh_command("%s", family.calibrate);
   if (sh_command_failed(result)) {
     AMP_LOG("==%s fail!", family.calibrate);
     return result;
   }
-  result = run_sh_command(family.save_status);
+  result = run_sh_command("%s", family.save_status);
   if (sh_command_failed(result)) {
     atci_log_untagged(LOG_LVL_ERR, "==current_status");
     return result;
@@ -70,7 +71,7 @@ int start_calibration(const AmplifierFamily& family) {
 // 1 calibrated, 0 not, -1 when the register cannot be read.
 int read_calibration(const AmplifierFamily& family) {
   AMP_LOG("%s", family.read_log);
-  if (sh_command_failed(run_sh_command(family.read_result))) {
+  if (sh_command_failed(run_sh_command("%s", family.read_result))) {
     AMP_LOG("===========sent command fial =====\r\n");
     return -1;
   }
@@ -80,8 +81,8 @@ int read_calibration(const AmplifierFamily& family) {
     AMP_LOG("/data/AmplifierCal open error\r\n");
     return -1;
   }
-  char text[kResultRead + 1] = {};
-  if (::read(fd.get(), text, kResultRead) == -1) {
+  char text[kResultRead + 1];
+  if (read_head(fd.get(), text, kResultRead) == -1) {
     AMP_LOG("/data/AmplifierCal read error\r\n");
     return -1;
   }
@@ -95,7 +96,7 @@ int read_calibration(const AmplifierFamily& family) {
 
 int finish_calibration(const AmplifierFamily& family) {
   AMP_LOG("%s", family.finish);
-  const int result = run_sh_command(family.finish);
+  const int result = run_sh_command("%s", family.finish);
   if (sh_command_failed(result)) {
     AMP_LOG("==%s fail!", family.finish);
     return result;
@@ -134,8 +135,8 @@ bool check_device(const char* dir_path, char* response, bool* first_failure) {
       ATCI_LOGE("failed to open %s\r\n", path);
       return false;
     }
-    char status[kStatusRead + 1] = {};
-    if (::read(fd.get(), status, kStatusRead) < 0) continue;
+    char status[kStatusRead + 1];
+    if (read_head(fd.get(), status, kStatusRead) < 0) continue;
     if (std::strstr(status, "ERROR") == nullptr) continue;
     std::string_view rest(status);
     const std::string_view token = next_token(rest, " ");  // the status up to its first space
@@ -156,8 +157,7 @@ int smart_speaker_Amplifier_calibrate_handler(char* cmdline, int, char* response
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+ZNGF=3")) return result_of(finish_calibration(family_of_model()) == 0);
-  ATCI_LOGE("===========sent command fial =====\r\n");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("===========sent command fial =====\r\n");
 }
 
 int i2c_device_test_handler(char* cmdline, int, char* response) {

@@ -1,6 +1,5 @@
 #include "commands/audio_path.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -8,6 +7,7 @@
 #include <unistd.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/audio.h"
@@ -90,15 +90,6 @@ void set_parameters(const char* text) {
   audio_set_parameters(text);
 }
 
-// Field `index` of the line split at ',' as strtok splits it (the command is field 0);
-// empty when there is none.
-std::string_view line_field(const char* cmdline, int index) {
-  std::string_view rest(cmdline);
-  std::string_view field;
-  for (int i = 0; i <= index; ++i) field = next_token(rest, ",");
-  return field.empty() ? std::string_view("") : field;  // never a null for a format
-}
-
 int atoi_field(std::string_view field) { return static_cast<int>(parse_long(field)); }
 
 // ---- AT+JVMT: receive, send and the shared sub-mic/headset echo loops
@@ -136,20 +127,15 @@ int run_loop_variant(const LoopVariant& variant, const char* cmdline) {
       ATCI_LOGD("**********aleady open AT+JVMT %s**********\r\n", variant.open_text);
       return RESULT_OK;
     }
-    const std::string_view gain = line_field(cmdline, 2);
+    const std::string_view gain = comma_field(cmdline, 2);
     const int volume = gain.empty() ? static_cast<int>(kDefaultVolume) : atoi_field(gain);
-    if (start_test(*variant.test, static_cast<uint32_t>(volume)) != 0) {
-      ATCI_LOGE("open %s test fail!", variant.test_name);
-      return RESULT_ERROR;
-    }
+    if (start_test(*variant.test, static_cast<uint32_t>(volume)) != 0)
+      return LOGGED_ERROR("open %s test fail!", variant.test_name);
     flag = 1;
     return RESULT_OK;
   }
   if (flag == 1) {
-    if (stop_test(*variant.test) != 0) {
-      ATCI_LOGE("exit %s test fail!", variant.test_name);
-      return RESULT_ERROR;
-    }
+    if (stop_test(*variant.test) != 0) return LOGGED_ERROR("exit %s test fail!", variant.test_name);
     flag = 0;
   }
   return RESULT_OK;
@@ -178,19 +164,15 @@ int run_echo_variant(const EchoVariant& variant) {
   ATCI_LOGD("%s_echo_flag=%d", variant.mic, flag);
   if (variant.start) {
     if (flag != 0) return RESULT_OK;
-    if (start_test(*variant.test) != 0) {
-      ATCI_LOGE("open %s mic echo test fail!", variant.mic);
-      return RESULT_ERROR;
-    }
+    if (start_test(*variant.test) != 0)
+      return LOGGED_ERROR("open %s mic echo test fail!", variant.mic);
     flag = 1;
     ATCI_LOGD("open %s mic echo test suceess!", variant.mic);
     return RESULT_OK;
   }
   if (flag != 1) return RESULT_OK;
-  if (stop_test(*variant.test) != 0 && !variant.closes_whatever) {
-    ATCI_LOGE("close %s mic echo test fail!", variant.mic);
-    return RESULT_ERROR;
-  }
+  if (stop_test(*variant.test) != 0 && !variant.closes_whatever)
+    return LOGGED_ERROR("close %s mic echo test fail!", variant.mic);
   flag = 0;
   ATCI_LOGD("close %s mic echo test suceess!", variant.mic);
   return RESULT_OK;
@@ -219,7 +201,7 @@ bool stop_ktv_loop(int& flag, const AudioTest& test, const char* stop_line, cons
 
 // The gain is the third field; a 0 is taken only when written with a leading '0'.
 bool ktv_gain(const char* cmdline, int* gain) {
-  const std::string_view field = line_field(cmdline, 2);
+  const std::string_view field = comma_field(cmdline, 2);
   if (field.empty()) {
     ATCI_LOGE("gain_multiples == NULL");
     return false;
@@ -271,9 +253,9 @@ constexpr HeadsetRoute kHeadsetToEarpieceWithGainRoute{
 
 // A gain field of the route family: present and decimal digits only.
 bool route_gain_field(const char* cmdline, int index, uint32_t* value) {
-  const std::string_view field = line_field(cmdline, index);
+  const std::string_view field = comma_field(cmdline, index);
   if (field.empty()) return false;
-  if (!std::all_of(field.begin(), field.end(), [](char c) { return c >= '0' && c <= '9'; })) {
+  if (!all_digits(field)) {
     ATCI_LOGE("====the gain multiples invalid:%.*s\r\n", static_cast<int>(field.size()),
               field.data());
     return false;
@@ -298,18 +280,14 @@ int run_headset_route(const HeadsetRoute& route, const char* cmdline, const char
   if (line_starts_with(cmdline, route.start_line)) {
     uint32_t volume = 0;
     if (!route_volume(route, cmdline, &volume)) return RESULT_ERROR;
-    if (start_test(*route.test, volume) != 0) {
-      ATCI_LOGE("open Receive Test test fail!");
-      return RESULT_ERROR;
-    }
+    if (start_test(*route.test, volume) != 0) return LOGGED_ERROR("open Receive Test test fail!");
     return RESULT_OK;
   }
   if (line_is(cmdline, route.stop_line)) {
     stop_test(*route.test);
     return RESULT_OK;
   }
-  ATCI_LOGE("========this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("========this at command invalid:%s====\r\n", cmdline);
 }
 
 // ---- AT+JVXL: loudspeaker playback, run by the audio library itself
@@ -354,10 +332,7 @@ int play_media_file(const MediaDrive& drive, std::string_view reference) {
   char extras[kExtrasSize];
   if (reference.find(".MP3") != std::string_view::npos) {
     std::snprintf(path, sizeof path, "%s%.*s.mp3", drive.audio_dir, name_len, name.data());
-    if (dev_access(path, R_OK) != 0) {
-      ATCI_LOGE("mp3 OPEN ERROR\n");
-      return RESULT_ERROR;
-    }
+    if (dev_access(path, R_OK) != 0) return LOGGED_ERROR("mp3 OPEN ERROR\n");
     std::snprintf(extras, sizeof extras,
                   "-e action start -e path %s -e output normal --ei volume 60", path);
     sendBroadcastFromAtcid(kMediaPlayerReceiver, kMediaPlayerAction, extras);
@@ -365,27 +340,20 @@ int play_media_file(const MediaDrive& drive, std::string_view reference) {
   }
   if (reference.find(".MP4") != std::string_view::npos) {
     std::snprintf(path, sizeof path, "%s%.*s.mp4", drive.video_dir, name_len, name.data());
-    if (dev_access(path, R_OK) != 0) {
-      ATCI_LOGE("mp4 OPEN ERROR\n");
-      return RESULT_ERROR;
-    }
+    if (dev_access(path, R_OK) != 0) return LOGGED_ERROR("mp4 OPEN ERROR\n");
     std::snprintf(extras, sizeof extras, "-e video_file_path %s%.*s.mp4", drive.video_view_dir,
                   name_len, name.data());
     startActivityFromAtcid("com.ulda.engineermode/.VideoFileView",
                            "android.factorytest.PLAY_VIDEO", extras);
     return RESULT_OK;
   }
-  ATCI_LOGE("%s", drive.no_suffix_text);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("%s", drive.no_suffix_text);
 }
 
 int stop_media_playback() {
   const int ret = run_sh_command("input keyevent 4");  // the back key leaves the player
   ATCI_LOGD("=======ret %d \r\n", ret);
-  if (sh_command_failed(ret)) {
-    ATCI_LOGE("===========sent command fail =====\r\n");
-    return RESULT_ERROR;
-  }
+  if (sh_command_failed(ret)) return LOGGED_ERROR("===========sent command fail =====\r\n");
   sendBroadcastFromAtcid(kMediaPlayerReceiver, kMediaPlayerAction, kStopPlayback);
   return RESULT_OK;
 }
@@ -398,23 +366,20 @@ int echo_handler(char* cmdline, int, char*) {
                                                : line_is(cmdline, variant.line);
     if (match) return run_loop_variant(variant, cmdline);
   }
-  ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
 }
 
 int mic_echo_handler(char* cmdline, int, char*) {
   for (const EchoVariant& variant : kEchoVariants)
     if (line_is(cmdline, variant.line)) return run_echo_variant(variant);
   if (!line_starts_with(cmdline, "AT+EALT=1") && !line_starts_with(cmdline, "AT+EALT=0"))
-    ATCI_LOGE("======this at command invalid:%s\r\n", cmdline);
+    return LOGGED_ERROR("======this at command invalid:%s\r\n", cmdline);
   return RESULT_ERROR;
 }
 
 int ktv_test_handler(char* cmdline, int, char*) {
-  if (line_is(cmdline, kKtvElectricStart) || line_is(cmdline, kKtvEchoStart)) {
-    ATCI_LOGE("Invalid AT command: %s\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (line_is(cmdline, kKtvElectricStart) || line_is(cmdline, kKtvEchoStart))
+    return LOGGED_ERROR("Invalid AT command: %s\r\n", cmdline);
   AudioTestFlags& flags = audio_test_flags;
   if (!stop_ktv_loop(flags.ktv_echo, kKtvEcho, "AT+JVKTV=0,2", "exit_ktv_echo_test_handler fail!",
                      cmdline) ||
@@ -424,10 +389,8 @@ int ktv_test_handler(char* cmdline, int, char*) {
   int gain = 0;
   if (line_starts_with(cmdline, kKtvEchoStart)) {
     if (!ktv_gain(cmdline, &gain)) return RESULT_ERROR;
-    if (start_test(kKtvEcho, static_cast<uint32_t>(gain)) != 0) {
-      ATCI_LOGE("start_ktv_echo_test_handler fail!");
-      return RESULT_ERROR;
-    }
+    if (start_test(kKtvEcho, static_cast<uint32_t>(gain)) != 0)
+      return LOGGED_ERROR("start_ktv_echo_test_handler fail!");
     set_ktv_parameters("SET_LOOPBACK_TYPE=4", gain);
     flags.ktv_echo = 1;
     return RESULT_OK;
@@ -436,16 +399,13 @@ int ktv_test_handler(char* cmdline, int, char*) {
     if (!ktv_gain(cmdline, &gain)) return RESULT_ERROR;
     // The electric loop wants its parameters before it starts.
     set_ktv_parameters("SET_LOOPBACK_TYPE=5", gain);
-    if (start_test(kKtvElectric, static_cast<uint32_t>(gain)) != 0) {
-      ATCI_LOGE("start_ktv_elec_test_handler fail!");
-      return RESULT_ERROR;
-    }
+    if (start_test(kKtvElectric, static_cast<uint32_t>(gain)) != 0)
+      return LOGGED_ERROR("start_ktv_elec_test_handler fail!");
     flags.ktv_electric = 1;
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVKTV=0,2") || line_is(cmdline, "AT+JVKTV=0,1")) return RESULT_OK;
-  ATCI_LOGE("Invalid AT command: %s\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("Invalid AT command: %s\r\n", cmdline);
 }
 
 int dual_mic_to_headset_handler(char* cmdline, int, char*) {
@@ -481,10 +441,7 @@ int play_ring_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVXL=1")) {
     if (playing != 0) return RESULT_OK;
     const int result = audio_ftm_process(kSpeakerPlaybackCase, 1, 1);
-    if (result != 0) {
-      ATCI_LOGE("Start Speaker Playback failed, error %d\n", result);
-      return RESULT_ERROR;
-    }
+    if (result != 0) return LOGGED_ERROR("Start Speaker Playback failed, error %d\n", result);
     playing = 1;
     return RESULT_OK;
   }
@@ -492,15 +449,11 @@ int play_ring_handler(char* cmdline, int, char*) {
     if (playing != 1) return RESULT_OK;
     const int result = audio_ftm_process(kSpeakerPlaybackCase, 0, 1);
     ftm_hw_deinit();
-    if (result != 0) {
-      ATCI_LOGE("Close Speaker Playback failed, error %d\n", result);
-      return RESULT_ERROR;
-    }
+    if (result != 0) return LOGGED_ERROR("Close Speaker Playback failed, error %d\n", result);
     playing = 0;
     return RESULT_OK;
   }
-  ATCI_LOGE("========this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("========this at command invalid:%s====\r\n", cmdline);
 }
 
 int ring_test_handler(char* cmdline, int, char*) {
@@ -508,7 +461,7 @@ int ring_test_handler(char* cmdline, int, char*) {
   char command[CMD_LINE_SIZE];
   std::snprintf(command, sizeof command, "%s", cmdline);
   command[std::strcspn(command, ",")] = '\0';
-  const std::string_view volume = line_field(cmdline, 1);
+  const std::string_view volume = comma_field(cmdline, 1);
   const int volume_len = static_cast<int>(volume.size());
   ATCI_LOGD("=======volume: %.*s\r\n", volume_len, volume.data());
   if (line_starts_with(command, "AT+JVMD=1")) {
@@ -524,20 +477,16 @@ int ring_test_handler(char* cmdline, int, char*) {
     sendBroadcastFromAtcid(kMediaPlayerReceiver, kMediaPlayerAction, kStopPlayback);
     return RESULT_OK;
   }
-  ATCI_LOGE("=====this at command invalid:%s\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("=====this at command invalid:%s\r\n", cmdline);
 }
 
 int play_media_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVMP=0")) return stop_media_playback();
-  if (!line_starts_with(cmdline, "AT+JVMP=1")) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
-  const std::string_view reference = line_field(cmdline, 1);
+  if (!line_starts_with(cmdline, "AT+JVMP=1"))
+    return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
+  const std::string_view reference = comma_field(cmdline, 1);
   for (const MediaDrive& drive : kMediaDrives)
     if (reference.find(drive.drive) != std::string_view::npos)
       return play_media_file(drive, reference);
-  ATCI_LOGE("===========Do not find play file =====\r\n");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("===========Do not find play file =====\r\n");
 }

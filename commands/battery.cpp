@@ -1,7 +1,6 @@
 #include "commands/battery.h"
 
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
@@ -28,25 +27,6 @@ constexpr const char* kStatus = "/sys/class/power_supply/battery/status";
 constexpr const char* kAcCurrent = "/sys/class/power_supply/cms/current_ac_avg_now";
 constexpr const char* kChargeCurrent = "/data/data/com.ulda.engineermode/files/ChargeCurrent";
 constexpr const char* kAuthentic = "/sys/class/power_supply/bms/authentic";
-
-// One integer as "%d" reads it: blanks, a sign, digits. A file without one, or with one
-// beyond int, counts as unreadable.
-bool read_int_file(const char* path, int& value) {
-  char text[32];
-  if (read_file_head(path, text, sizeof text - 1) < 0) {
-    ATCI_LOGE("cannot open %s", path);
-    return false;
-  }
-  std::string_view rest(text);
-  rest.remove_prefix(std::min(rest.find_first_not_of(" \t\r\n\v\f"), rest.size()));
-  if (!rest.empty() && rest.front() == '+') rest.remove_prefix(1);
-  const auto [end, error] = std::from_chars(rest.data(), rest.data() + rest.size(), value);
-  if (error != std::errc() || end == rest.data()) {
-    ATCI_LOGE("no integer in %s", path);
-    return false;
-  }
-  return true;
-}
 
 // Each integer goes through single precision, then is divided in double precision.
 double scaled(int value, double divisor) { return static_cast<float>(value) / divisor; }
@@ -90,10 +70,7 @@ int charger_write(const char* cmdline) {
   for (const ChargerWrite& w : kChargerWrites) {
     if (!line_is(cmdline, w.variant)) continue;
     UniqueFd fd(dev_open(w.path, O_WRONLY | O_CREAT | O_TRUNC, 0666));
-    if (!fd.ok()) {
-      ATCI_LOGE("cannot open %s", w.path);
-      return RESULT_ERROR;
-    }
+    if (!fd.ok()) return LOGGED_ERROR("cannot open %s", w.path);
     const bool written = write_full(fd.get(), w.text, std::strlen(w.text));
     if (!written) ATCI_LOGE("cannot write %s", w.path);
     return result_of(written || !w.needs_write);
@@ -126,10 +103,7 @@ int eadc_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+EADC=3")) {
     char text[32] = {};
     const ssize_t n = read_file_head(kChargeCurrent, text, 20);
-    if (n <= 1) {
-      ATCI_LOGE("no charge current in %s", kChargeCurrent);
-      return RESULT_ERROR;
-    }
+    if (n <= 1) return LOGGED_ERROR("no charge current in %s", kChargeCurrent);
     return answer_quoted(response, text);
   }
   return REJECT_COMMAND_LINE(cmdline);
@@ -147,10 +121,7 @@ int jvdlj_handler(char* cmdline, int, char* response) {
 int jvcharge_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVCHARGE=0")) return REJECT_COMMAND_LINE(cmdline);
   char text[41];
-  if (read_file_head(kStatus, text, 40) < 0) {
-    ATCI_LOGE("cannot read %s", kStatus);
-    return RESULT_ERROR;
-  }
+  if (read_file_head(kStatus, text, 40) < 0) return LOGGED_ERROR("cannot read %s", kStatus);
   const std::string_view status(text);
   return result_of(status.find("Full") != std::string_view::npos ||
                    status.find("Charging") != std::string_view::npos);

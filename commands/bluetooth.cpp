@@ -1,12 +1,11 @@
 #include "commands/bluetooth.h"
 
-#include <cctype>
 #include <cstdio>
 #include <cstring>
 #include <string_view>
 
 #include "commands/command_util.h"
-#include "commands/radio_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -24,10 +23,8 @@ constexpr const char* kScanFile = "/data/user/0/com.ulda.engineermode/bt_device"
 int dut_check() {
   char state[PROPERTY_VALUE_MAX];
   property_get("bluetooth.bdt.pemudut", state, "");
-  if (std::strstr(state, "true") == nullptr) {
-    ATCI_LOGE("===is not enter BT ftm Test mode \r\n");
-    return RESULT_ERROR;
-  }
+  if (std::strstr(state, "true") == nullptr)
+    return LOGGED_ERROR("===is not enter BT ftm Test mode \r\n");
   return RESULT_OK;
 }
 
@@ -43,43 +40,30 @@ int write_address(const char* cmdline) {
   CommaFields fields(cmdline);
   fields.next();  // "BT"
   const std::string_view address = fields.next();
-  if (address.empty()) {
-    ATCI_LOGE("========bt_addr is NULL\n");
-    return RESULT_ERROR;
-  }
-  if (address.size() < 2 * kAddressBytes) {
-    ATCI_LOGE("========bt_addr too short: %.*s\n", static_cast<int>(address.size()),
-              address.data());
-    return RESULT_ERROR;
-  }
+  if (address.empty()) return LOGGED_ERROR("========bt_addr is NULL\n");
+  if (address.size() < 2 * kAddressBytes)
+    return LOGGED_ERROR("========bt_addr too short: %.*s\n", static_cast<int>(address.size()),
+                        address.data());
   uint8_t b[kAddressBytes];
   for (size_t i = 0; i < kAddressBytes; ++i)
     b[i] = static_cast<uint8_t>(nibble(address[2 * i]) << 4 | nibble(address[2 * i + 1]));
-  char command[CMD_LINE_SIZE];
   // The tool takes the bytes in reverse order.
-  std::snprintf(command, sizeof command, "btnvtool -b %02X.%02X.%02X.%02X.%02X.%02X", b[5], b[4],
-                b[3], b[2], b[1], b[0]);
-  run_tool(command);
+  run_sh_command("btnvtool -b %02X.%02X.%02X.%02X.%02X.%02X", b[5], b[4], b[3], b[2], b[1], b[0]);
   return RESULT_OK;
 }
 
 int read_address(char* response) {
   bt_nv_item items[BT_NV_ITEMS] = {};
   const int count = bt_nv_read(items);
-  if (count < 0) {
-    ATCI_LOGE("BT-NV-CMD: Read from NV persist failed\n");
-    return RESULT_ERROR;
-  }
+  if (count < 0) return LOGGED_ERROR("BT-NV-CMD: Read from NV persist failed\n");
   ATCI_LOGD("BT-NV-CMD: numitems = %d\n", count);
   const int searched = count < BT_NV_ITEMS ? count : BT_NV_ITEMS;
   for (int i = 0; i < searched; ++i) {
     const bt_nv_item& item = items[i];
     if (item.id != kAddressItem) continue;
     ATCI_LOGD("BT-NV-CMD: Found NV item at '%d'\n", i);
-    if (!item.value_read || item.length < kAddressBytes) {
-      ATCI_LOGE("BT-NV-CMD: address item holds %d bytes\n", item.length);
-      return RESULT_ERROR;
-    }
+    if (!item.value_read || item.length < kAddressBytes)
+      return LOGGED_ERROR("BT-NV-CMD: address item holds %d bytes\n", item.length);
     const uint8_t* v = item.value;
     ATCI_LOGD("BT-NV-CMD: NV_READ_F: BD Addr: %02x %02x %02x %02x %02x %02x\n", v[0], v[1], v[2],
               v[3], v[4], v[5]);
@@ -87,16 +71,12 @@ int read_address(char* response) {
                   v[3], v[2], v[1], v[0]);
     return RESULT_OK;
   }
-  ATCI_LOGE("BT-NV-CMD: no address item among the first %d\n", searched);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("BT-NV-CMD: no address item among the first %d\n", searched);
 }
 
 int read_scan(char* response) {
   UniqueFile file(dev_fopen(kScanFile, "r"));
-  if (!file) {
-    ATCI_LOGE("fail to open %s\r\n", kScanFile);
-    return RESULT_ERROR;
-  }
+  if (!file) return LOGGED_ERROR("fail to open %s\r\n", kScanFile);
   char line[256];
   for (int n = 0; n < 5 && std::fgets(line, sizeof line, file.get()) != nullptr; ++n) {
     body_append(response, n == 0 ? "\r\n\"" : ",\r\n");
@@ -106,12 +86,7 @@ int read_scan(char* response) {
   return RESULT_OK;
 }
 
-bool is_channel(std::string_view channel) {
-  if (channel.empty() || channel.size() > 3) return false;
-  for (char c : channel)
-    if (!std::isdigit(static_cast<unsigned char>(c))) return false;
-  return true;
-}
+bool is_channel(std::string_view channel) { return channel.size() <= 3 && all_digits(channel); }
 
 }  // namespace
 
@@ -153,28 +128,19 @@ int bt_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+EMBT=4")) return dut_check();
   if (line_starts_with(cmdline, "AT+EMBT=0,BT")) return write_address(cmdline);
   if (line_is(cmdline, "AT+EMBT=1")) {
-    run_tool("bdt entrydut");
+    run_sh_command("bdt entrydut");
     return dut_check();
   }
   if (line_starts_with(cmdline, "AT+EMBT=1")) {
     CommaFields fields(cmdline);
     const std::string_view channel = fields.next();
-    if (channel.empty()) {
-      ATCI_LOGE("========bt_channel is NULL\n");
-      return RESULT_ERROR;
-    }
-    if (!is_channel(channel)) {
-      ATCI_LOGE("========bt_channel is not a channel\n");
-      return RESULT_ERROR;
-    }
-    char command[CMD_LINE_SIZE];
-    std::snprintf(command, sizeof command, "bdt txcontinuous %.*s",
-                  static_cast<int>(channel.size()), channel.data());
-    run_tool(command);
+    if (channel.empty()) return LOGGED_ERROR("========bt_channel is NULL\n");
+    if (!is_channel(channel)) return LOGGED_ERROR("========bt_channel is not a channel\n");
+    run_sh_command("bdt txcontinuous %.*s", static_cast<int>(channel.size()), channel.data());
     return dut_check();
   }
   if (line_is(cmdline, "AT+EMBT=2")) {
-    run_tool("bdt exitdut");
+    run_sh_command("bdt exitdut");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+EMBT=6")) {

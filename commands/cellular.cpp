@@ -11,7 +11,8 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
-#include "commands/radio_util.h"
+#include "commands/device_info.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"
@@ -30,14 +31,6 @@ void log_cmdline(const char* caller, const char* cmdline) {
   atci_log(LOG_LVL_DEBUG, __LINE__, caller, "===========cmdline %s\r\n", cmdline);
 }
 
-// A field as a writable, terminated copy of at most N - 1 characters.
-template <size_t N>
-void copy_field(char (&out)[N], std::string_view field) {
-  const size_t n = field.size() < N - 1 ? field.size() : N - 1;
-  std::memcpy(out, field.data(), n);
-  out[n] = '\0';
-}
-
 // A broadcast switch of two whole-line variants: "=1" sends `on`, "=0" sends `off`.
 struct Switch {
   const char* on_line;
@@ -51,10 +44,8 @@ int broadcast_switch(const Switch& s, const char* cmdline) {
   const char* extras = line_is(cmdline, s.on_line)    ? s.on_extras
                        : line_is(cmdline, s.off_line) ? s.off_extras
                                                       : nullptr;
-  if (extras == nullptr) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (extras == nullptr)
+    return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
   sendBroadcastFromAtcid(nullptr, s.action, extras);
   return RESULT_OK;
 }
@@ -71,25 +62,14 @@ bool int_request(IntRequest request, int32_t value, QmiResult& result) {
   return rc == 0 && result.flag == 0;
 }
 
-constexpr std::string_view kPresentSimStates[] = {
-    "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
-    "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
-};
-
+// Slot 2 is the second field of "gsm.sim.state" as strtok finds it (",READY" has none), or
+// the property of its own.
 bool sim2_present() {
   char states[PROPERTY_VALUE_MAX];
   property_get("gsm.sim.state", states, " ");
-  std::string_view sim2(states);
-  if (sim2.find(',') != std::string_view::npos) {
-    next_token(sim2, ",");
-    sim2 = next_token(sim2, ",");
-  } else {
-    property_get("gsm.sim.state.2", states, " ");
-    sim2 = states;
-  }
-  for (std::string_view present : kPresentSimStates)
-    if (sim2 == present) return true;
-  return false;
+  if (std::strchr(states, ',') != nullptr) return sim_state_present(comma_field(states, 1));
+  property_get("gsm.sim.state.2", states, " ");
+  return sim_state_present(states);
 }
 
 // Modem NV items behind the MEID and WLAN MAC commands.
@@ -111,26 +91,17 @@ int nv_read(const NvCommand& nv, char* response) {
   wait.transp_err = -1;
   const int rc = qmi_kro_read_nv_msg_ex(&req, sizeof req, QMI_KRO_READ_NV_INFO_RESP_MSG_V01, &resp,
                                         sizeof resp, &wait);
-  if (rc != 0 || wait.msg_id != QMI_KRO_READ_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0) {
-    ATCI_LOGE("ret=%d, msg_id=%d, status=%d", rc, wait.msg_id, wait.transp_err);
-    return RESULT_ERROR;
-  }
-  if (resp.buffer_valid != 1) {
-    ATCI_LOGE("get_nv_rsp.buffer_valid:%d", resp.buffer_valid);
-    return RESULT_ERROR;
-  }
+  if (rc != 0 || wait.msg_id != QMI_KRO_READ_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0)
+    return LOGGED_ERROR("ret=%d, msg_id=%d, status=%d", rc, wait.msg_id, wait.transp_err);
+  if (resp.buffer_valid != 1) return LOGGED_ERROR("get_nv_rsp.buffer_valid:%d", resp.buffer_valid);
   std::snprintf(response, RESPONSE_SIZE, "%.*s", static_cast<int>(sizeof resp.buffer),
                 resp.buffer);
   return RESULT_OK;
 }
 
 int nv_write(const NvCommand& nv, const char* cmdline) {
-  CommaFields fields(cmdline);
-  const std::string_view field = fields.next();
-  if (field.empty()) {
-    ATCI_LOGE("========The wlan addr is NULL====");
-    return RESULT_ERROR;
-  }
+  const std::string_view field = comma_field(cmdline, 1);
+  if (field.empty()) return LOGGED_ERROR("========The wlan addr is NULL====");
   char value[CMD_LINE_SIZE];
   copy_field(value, field);
   substring(value);
@@ -147,8 +118,7 @@ int nv_write(const NvCommand& nv, const char* cmdline) {
   if (rc != 0 || wait.msg_id != QMI_KRO_WRITE_NV_INFO_RESP_MSG_V01 || wait.transp_err != 0 ||
       resp.result != 0) {
     ATCI_LOGE("ret=%d, msg_id=%d, status=%d\n", rc, wait.msg_id, wait.transp_err);
-    ATCI_LOGE("error=%d, result=%d\n", resp.error, resp.result);
-    return RESULT_ERROR;
+    return LOGGED_ERROR("error=%d, result=%d\n", resp.error, resp.result);
   }
   return RESULT_OK;
 }
@@ -181,8 +151,7 @@ int plan_mode_test_handler(char* cmdline, int, char*) {
       sendBroadcastFromAtcid(nullptr, "android.intent.action.AT_AIRPLANE_MODE", "--ez state false");
     return RESULT_OK;
   }
-  ATCI_LOGE("====this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("====this at command invalid:%s====\r\n", cmdline);
 }
 
 int status_bar_3g_handler(char* cmdline, int, char*) {
@@ -216,10 +185,8 @@ int fast_search_test_handler(char* cmdline, int, char*) {
     const std::string_view sim = fields.next();
     const std::string_view act = fields.next();
     const std::string_view channel = fields.next();
-    if (sim.empty() || act.empty() || channel.empty()) {
-      ATCI_LOGE("===========sim OR act OR channel is NULL\r\n");
-      return RESULT_ERROR;
-    }
+    if (sim.empty() || act.empty() || channel.empty())
+      return LOGGED_ERROR("===========sim OR act OR channel is NULL\r\n");
     char extras[256];
     std::snprintf(extras, sizeof extras, "--es status 1 --es sim %.*s --es act %.*s --es arfcn %.*s",
                   static_cast<int>(sim.size()), sim.data(), static_cast<int>(act.size()),
@@ -231,16 +198,13 @@ int fast_search_test_handler(char* cmdline, int, char*) {
     sendBroadcastFromAtcid(nullptr, kFastSearchNet, "--es status 0");
     return RESULT_OK;
   }
-  ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
 }
 
 int radio_type_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
-  if (!line_is(cmdline, "AT+JVRADIO=0")) {
-    ATCI_LOGE("=======this at command invalid:%s*\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (!line_is(cmdline, "AT+JVRADIO=0"))
+    return LOGGED_ERROR("=======this at command invalid:%s*\r\n", cmdline);
   struct RadioType {
     const char* abbr;
     const char* bands;
@@ -274,17 +238,14 @@ int set_sim2_status_handler(char* cmdline, int, char* response) {
     int32_t value;
   };
   static constexpr Sim2Switch kSwitches[] = {
-      {"AT+JVSIMT=0", "/system/bin/sh -c \"touch /data/sim2_status\"",
+      {"AT+JVSIMT=0", "touch /data/sim2_status",
        "Touch /data/sim2_status fail!\r\n", 0},
-      {"AT+JVSIMT=1", "/system/bin/sh -c \"rm /data/sim2_status \"",
+      {"AT+JVSIMT=1", "rm /data/sim2_status ",
        "rm /data/sim2_status fail!\r\n", 1},
   };
   for (const Sim2Switch& s : kSwitches) {
     if (!line_is(cmdline, s.line)) continue;
-    if (run_shell(s.command) < 0) {
-      ATCI_LOGE("%s", s.failure);
-      return RESULT_ERROR;
-    }
+    if (run_sh_command("%s", s.command) < 0) return LOGGED_ERROR("%s", s.failure);
     QmiResult ignored;
     int_request(qmi_switch_sim2_status, s.value, ignored);
     return RESULT_OK;
@@ -297,8 +258,7 @@ int primary_or_diversity_handler(char* cmdline, int, char* response) {
   log_cmdline(__func__, cmdline);
   QmiResult answer;
   if (line_starts_with(cmdline, "AT+JVZFTX=1")) {
-    CommaFields fields(cmdline);
-    const std::string_view n = fields.next();
+    const std::string_view n = comma_field(cmdline, 1);
     if (n.empty()) return RESULT_ERROR;
     return result_of(int_request(mutuallySwitchForPrimaryAndDiversity,
                                  static_cast<int32_t>(parse_long(n)), answer));
@@ -344,10 +304,8 @@ int virtual_sim_handler(char* cmdline, int, char* response) {
     property_set("persist.sys.tel.autoanswer.ms", "5");
   }
   QmiResult answer;
-  if (!int_request(qmi_set_status, v->code, answer)) {
-    ATCI_LOGE("======send qmi msg fail\n");
-    return RESULT_ERROR;
-  }
+  if (!int_request(qmi_set_status, v->code, answer))
+    return LOGGED_ERROR("======send qmi msg fail\n");
   if (v->code == 14) {
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db");
     dev_unlink("/data/data/com.android.providers.telephony/databases/telephony.db-journal");
@@ -406,16 +364,14 @@ int nfc_tag_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVNFC=2")) return RESULT_ERROR;
   constexpr const char* kTagId = "/data/data/com.android.nfc/files/TagId";
   UniqueFd fd(dev_open(kTagId, O_RDONLY | O_CLOEXEC));
-  if (!fd.ok()) {
-    ATCI_LOGE("==open %s fail\r\n", kTagId);
-    return RESULT_ERROR;
-  }
-  unsigned char tag[20];
-  const ssize_t n = ::read(fd.get(), tag, sizeof tag);
+  if (!fd.ok()) return LOGGED_ERROR("==open %s fail\r\n", kTagId);
+  char tag[21];
+  const ssize_t n = read_head(fd.get(), tag, sizeof tag - 1);
   ATCI_LOGD("==read %s:%d\r\n", kTagId, static_cast<int>(n));
   if (n <= 3) return RESULT_ERROR;
   char hex[2 * sizeof tag + 1] = {};
-  for (ssize_t i = 0; i < n; ++i) std::snprintf(hex + 2 * i, 3, "%02x", tag[i]);
+  for (ssize_t i = 0; i < n; ++i)
+    std::snprintf(hex + 2 * i, 3, "%02x", static_cast<unsigned char>(tag[i]));
   return answer_quoted(response, hex);
 }
 
@@ -428,18 +384,13 @@ int conn_wifi_handler(char* cmdline, int, char*) {
   constexpr std::string_view kName = "AT+JVCONNWIFI";
   const std::string_view line(cmdline);
   if (!line_starts_with(cmdline, "AT+JVCONNWIFI") ||
-      (line.size() > kName.size() && line[kName.size()] != '=')) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
+      (line.size() > kName.size() && line[kName.size()] != '='))
+    return LOGGED_ERROR("==command invalid:%s", cmdline);
   std::string_view rest = line.substr(std::min(line.find('='), line.size()));
   if (!rest.empty()) rest.remove_prefix(1);
   const std::string_view ssid_field = next_token(rest, ",");
   const std::string_view pwd_field = next_token(rest, ",");
-  if (ssid_field.empty()) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
+  if (ssid_field.empty()) return LOGGED_ERROR("==command invalid:%s", cmdline);
   char ssid[CMD_LINE_SIZE];
   char pwd[CMD_LINE_SIZE];
   copy_field(ssid, ssid_field);
@@ -453,6 +404,6 @@ int conn_wifi_handler(char* cmdline, int, char*) {
   ::sleep(50);
   sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 4");
   platform_sync();
-  ::usleep(150 * 1000);
+  sleep_ms(150);
   platform_restart();
 }

@@ -6,10 +6,10 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
-#include "platform/unique_fd.h"
 #include "services/factory_support.h"
 
 namespace {
@@ -29,14 +29,9 @@ int name_number(const std::string_view (&names)[N], std::string_view field) {
 }
 
 int read_system_time(char* response) {
-  run_shell("/system/bin/sh -c \"date > /data/systemtime\"");
-  UniqueFile file(dev_fopen(kTimeScratch, "r"));
-  if (!file) {
-    ATCI_LOGE("/data/systemtime open file failed\n");
-    return RESULT_ERROR;
-  }
-  char line[101] = {};
-  if (std::fgets(line, sizeof line, file.get()) == nullptr) line[0] = '\0';
+  char line[101];
+  if (sh_first_line("date", kTimeScratch, line, sizeof line) < 0)
+    return LOGGED_ERROR("/data/systemtime open file failed\n");
   ATCI_LOGD("buf=%s\n", line);
   std::string_view rest(line);
   std::string_view fields[6];
@@ -46,10 +41,7 @@ int read_system_time(char* response) {
   std::string_view year = fields[5];
   ATCI_LOGD("========YEAR1: %.*s\n", static_cast<int>(zone.size()), zone.data());
   year = year.substr(0, year.find_first_of("\r\n"));
-  if (year.empty()) {
-    ATCI_LOGE("date output too short: %s", line);
-    return RESULT_ERROR;
-  }
+  if (year.empty()) return LOGGED_ERROR("date output too short: %s", line);
   char date_text[128];
   std::snprintf(date_text, sizeof date_text, "%.*s-%d-%.*s", static_cast<int>(year.size()),
                 year.data(), name_number(kMonthNames, month), static_cast<int>(day.size()),
@@ -59,13 +51,6 @@ int read_system_time(char* response) {
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%s\"\r\n\"%.*s\"\r\n\"%d\"\r\n", date_text,
                 static_cast<int>(time.size()), time.data(), name_number(kWeekdayNames, week));
   return RESULT_OK;
-}
-
-bool all_digits(std::string_view text) {
-  if (text.empty()) return false;
-  for (char c : text)
-    if (c < '0' || c > '9') return false;
-  return true;
 }
 
 int set_system_time(const char* cmdline) {
@@ -90,12 +75,13 @@ int set_system_time(const char* cmdline) {
   // Station text goes into a shell command: digits only.
   for (std::string_view field : fields)
     if (!all_digits(field)) return RESULT_ERROR;
-  char command[CMD_LINE_SIZE + 64];
-  std::snprintf(command, sizeof command, "/system/bin/sh -c \"date -s %.*s%.*s%.*s.%.*s%.*s%.*s \"",
-                static_cast<int>(year.size()), year.data(), static_cast<int>(month.size()),
-                month.data(), static_cast<int>(day.size()), day.data(),
-                static_cast<int>(hour.size()), hour.data(), static_cast<int>(minute.size()),
-                minute.data(), static_cast<int>(second.size()), second.data());
+  char command[SH_COMMAND_SIZE];
+  if (!sh_command_text(command, "date -s %.*s%.*s%.*s.%.*s%.*s%.*s ",
+                       static_cast<int>(year.size()), year.data(), static_cast<int>(month.size()),
+                       month.data(), static_cast<int>(day.size()), day.data(),
+                       static_cast<int>(hour.size()), hour.data(), static_cast<int>(minute.size()),
+                       minute.data(), static_cast<int>(second.size()), second.data()))
+    return RESULT_ERROR;
   ATCI_LOGD(" cmd %s\n", command);
   const int ret = run_shell(command);
   ATCI_LOGD("==ret=%d \r\n", ret);
@@ -142,8 +128,7 @@ int get_system_time_handler(char* cmdline, int, char* response) {
   ATCI_LOGD("===========cmdline %s\r\n", cmdline);
   if (line_is(cmdline, "AT+JVSJ=0")) return read_system_time(response);
   if (line_starts_with(cmdline, "AT+JVSJ=1")) return set_system_time(cmdline);
-  ATCI_LOGE("=====this at command invalid:%s\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("=====this at command invalid:%s\r\n", cmdline);
 }
 
 int set_language_handler(char* cmdline, int, char* response) {
@@ -153,10 +138,9 @@ int set_language_handler(char* cmdline, int, char* response) {
     return RESULT_OK;
   }
   if (line_starts_with(cmdline, "AT+JVLC=1,")) {
-    std::string_view rest(cmdline);
-    next_token(rest, ",");
-    const std::string_view language = next_token(rest, ",");
-    const std::string_view region = next_token(rest, ",");
+    CommaFields fields(cmdline);
+    const std::string_view language = fields.next();
+    const std::string_view region = fields.next();
     if (!is_locale_code(language) || !is_locale_code(region)) return RESULT_ERROR;
     broadcast_language(language, region);
     return RESULT_OK;
@@ -185,6 +169,5 @@ int set_default_language_handler(char* cmdline, int, char*) {
     broadcast_language(wanted.language, wanted.region);
     return RESULT_OK;
   }
-  ATCI_LOGE("=======this at command invalid\r\n");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("=======this at command invalid\r\n");
 }

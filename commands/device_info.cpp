@@ -51,7 +51,7 @@ constexpr FileQuery kRearCamera{"AT+JVCCMID=0", "sys/ccm/RearSensorId", kFirstLi
 bool read_query_value(const FileQuery& query, char* value) {
   static_assert(kFirstLineSize <= kMaxQueryRead && 200 <= kMaxQueryRead);
   if (query.extract == Extract::kHead) return read_file_value(query.path, value, query.limit);
-  if (read_first_line(query.path, value, query.limit) != 0) {
+  if (read_first_line(query.path, value, query.limit) <= 0) {
     ATCI_LOGE("cannot read %s", query.path);
     return false;
   }
@@ -76,18 +76,6 @@ bool read_small_file(const char* path, char (&buf)[kSmallFileSize + 1]) {
     return false;
   }
   return true;
-}
-
-// The SIM states that mean a card is in the slot.
-constexpr std::string_view kPresentSimStates[] = {
-    "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
-    "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
-};
-
-bool sim_state_present(std::string_view state) {
-  for (std::string_view present : kPresentSimStates)
-    if (state == present) return true;
-  return false;
 }
 
 // Dual-SIM phones report both slots in "gsm.sim.state" as "slot1,slot2"; others have a
@@ -115,6 +103,16 @@ void read_sim_slots(SimSlots& sim, const char* fallback) {
 
 }  // namespace
 
+bool sim_state_present(std::string_view state) {
+  static constexpr std::string_view kPresentSimStates[] = {
+      "PIN_REQUIRED", "PUK_REQUIRED",  "NETWORK_LOCKED", "READY",
+      "NOT_READY",    "PERM_DISABLED", "CARD_IO_ERROR",  "PERSO_LOCKED",
+  };
+  for (std::string_view present : kPresentSimStates)
+    if (state == present) return true;
+  return false;
+}
+
 int is_product_model(const char* model) {
   char value[PROPERTY_VALUE_MAX];
   property_get("ro.pemu.product.model", value, "");
@@ -131,18 +129,14 @@ int jvmodel_handler(char* cmdline, int, char* response) {
 int jvram_handler(char* cmdline, int, char* response) {
   if (!line_starts_with(cmdline, "AT+JVRAM=0")) return REJECT_COMMAND_LINE(cmdline);
   char line[kFirstLineSize];
-  if (read_first_line("/proc/meminfo", line, sizeof line) != 0) {
-    ATCI_LOGE("cannot read /proc/meminfo");
-    return RESULT_ERROR;
-  }
+  if (read_first_line("/proc/meminfo", line, sizeof line) <= 0)
+    return LOGGED_ERROR("cannot read /proc/meminfo");
   std::string_view rest(line);
   constexpr std::string_view kBlanks = " \t\r\n";
   const std::string_view name = next_token(rest, kBlanks);
   const std::string_view size_kb = next_token(rest, kBlanks);
-  if (name.find("MemTotal") == std::string_view::npos || size_kb.empty()) {
-    ATCI_LOGE("no MemTotal in: %s", line);
-    return RESULT_ERROR;
-  }
+  if (name.find("MemTotal") == std::string_view::npos || size_kb.empty())
+    return LOGGED_ERROR("no MemTotal in: %s", line);
   return answer_quoted_int(response, static_cast<int>(parse_long(size_kb) / 1024));
 }
 
@@ -160,10 +154,8 @@ int jvrid_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVRID=1")) return REJECT_COMMAND_LINE(cmdline);
   // 32 hex digits; the line end after them is not read.
   char cid[33];
-  if (read_file_head("/sys/block/mmcblk0/device/cid", cid, 32) < 0) {
-    ATCI_LOGE("cannot open the card identity");
-    return RESULT_ERROR;
-  }
+  if (read_file_head("/sys/block/mmcblk0/device/cid", cid, 32) < 0)
+    return LOGGED_ERROR("cannot open the card identity");
   return answer_quoted(response, cid);
 }
 
@@ -185,10 +177,8 @@ int jvseboot_handler(char* cmdline, int, char*) {
 int jvbbtype_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVBBTYPE=0")) return REJECT_COMMAND_LINE(cmdline);
   char line[128];
-  if (read_first_line(kMppsValue, line, sizeof line) != 0) {
-    ATCI_LOGE("cannot read %s", kMppsValue);
-    return RESULT_ERROR;
-  }
+  if (read_first_line(kMppsValue, line, sizeof line) <= 0)
+    return LOGGED_ERROR("cannot read %s", kMppsValue);
   const std::string_view text(line);
   if (text.find("cpu") == std::string_view::npos) return RESULT_ERROR;
   // The first test that holds decides, so a loose "AB" beats a strict "cpu--AA". Each strict
@@ -203,8 +193,7 @@ int jvbbtype_handler(char* cmdline, int, char* response) {
   };
   for (const Variant& variant : kVariants)
     if (text.find(variant.mark) != std::string_view::npos) return answer_quoted(response, variant.chip);
-  ATCI_LOGE("unknown processor variant: %s", line);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("unknown processor variant: %s", line);
 }
 
 int jvmpps_handler(char* cmdline, int, char* response) {
@@ -239,10 +228,8 @@ int jvtwst_handler(char* cmdline, int, char* response) {
   char model[PROPERTY_VALUE_MAX];
   property_get("ro.build.version.kro", build, " ");
   property_get("ro.product.model.kro", model, "QT0102");
-  if (std::strcmp(build, " ") == 0 || std::strcmp(model, " ") == 0) {
-    ATCI_LOGE("build version or model not set");
-    return RESULT_ERROR;
-  }
+  if (std::strcmp(build, " ") == 0 || std::strcmp(model, " ") == 0)
+    return LOGGED_ERROR("build version or model not set");
   char firmware[11];
   if (!read_file_value("/sys/touchscreen/firmware_version", firmware)) return RESULT_ERROR;
   firmware[std::strcspn(firmware, "\n")] = '\0';
@@ -309,10 +296,7 @@ int jvts_handler(char* cmdline, int, char* response) {
   else
     return REJECT_COMMAND_LINE(cmdline);
   UniqueFile file(dev_fopen(path, "r"));
-  if (!file) {
-    ATCI_LOGE("cannot open %s", path);
-    return RESULT_ERROR;
-  }
+  if (!file) return LOGGED_ERROR("cannot open %s", path);
   char line[128];
   char piece[sizeof line + 4];
   while (std::fgets(line, sizeof line, file.get()) != nullptr) {

@@ -2,6 +2,11 @@
 // and card state, the hall switch and the fingerprint sensor.
 #pragma once
 
+#include <string_view>
+
+// A SIM state that means a card is in the slot ("READY", "PIN_REQUIRED", ...).
+bool sim_state_present(std::string_view state);
+
 // 1 when "ro.pemu.product.model" is exactly `model` ("QM0305" is not "QM0305A"); read afresh
 // on every call.
 int is_product_model(const char* model);

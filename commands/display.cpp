@@ -7,9 +7,9 @@
 #include <fcntl.h>
 #include <string>
 #include <string_view>
-#include <unistd.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/transport.h"
 #include "platform/platform.h"
 #include "platform/unique_fd.h"
@@ -24,35 +24,16 @@ constexpr const char* kLcmAction = "android.factorytest.ATLCM";
 constexpr const char* kColourCalibration = "/sys/class/leds/lcd-backlight/lcm_color_cali";
 constexpr const char* kCamera = "com.android.camera";
 
-// The second comma-separated field of the line; empty when there is none.
-std::string_view second_field(const char* cmdline) {
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  return next_token(rest, ",");
-}
-
-bool all_digits(std::string_view text) {
-  if (text.empty()) return false;
-  for (const char c : text)
-    if (c < '0' || c > '9') return false;
-  return true;
-}
-
 int set_colour_type(const char* cmdline) {
-  const std::string_view field = second_field(cmdline);
+  const std::string_view field = comma_field(cmdline, 1);
   if (!all_digits(field)) return REJECT_COMMAND_LINE(cmdline);
   unsigned long type = 0;
   if (std::from_chars(field.data(), field.data() + field.size(), type).ec != std::errc() ||
-      type > 1) {
-    ATCI_LOGE("just surport 0 & 1");
-    return RESULT_ERROR;
-  }
+      type > 1)
+    return LOGGED_ERROR("just surport 0 & 1");
   {
     UniqueFd fd(dev_open(kColourCalibration, O_WRONLY | O_TRUNC));
-    if (!fd.ok()) {
-      ATCI_LOGE("cannot open %s", kColourCalibration);
-      return RESULT_ERROR;
-    }
+    if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kColourCalibration);
     if (!write_full(fd.get(), field.data(), field.size()))
       ATCI_LOGE("cannot write %s", kColourCalibration);
   }
@@ -68,11 +49,11 @@ int set_colour_type(const char* cmdline) {
 // The unit goes to sleep: the answer leaves first, since the port goes quiet after it.
 int sleep_now(int fb) {
   write_early_answer("AT+EQSB=0", "OK", true);
-  run_shell("/system/bin/sh -c \"echo \"255\" > /sys/class/leds/lcd-backlight/brightness\"");
-  run_shell("/system/bin/sh -c \"echo \"0\" > /sys/class/leds/lcd-backlight/brightness\"");
-  run_shell("/system/bin/sh -c \"echo 1 > /sys/touchscreen/suspend_cmd\"");
+  run_sh_commands({"echo \"255\" > /sys/class/leds/lcd-backlight/brightness",
+                   "echo \"0\" > /sys/class/leds/lcd-backlight/brightness",
+                   "echo 1 > /sys/touchscreen/suspend_cmd"});
   if (platform_fb_blank(fb, PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
-  run_shell("/system/bin/sh -c \"echo \"mem\" > /sys/power/autosleep\"");
+  run_sh_command("echo \"mem\" > /sys/power/autosleep");
   return RESULT_DONE;
 }
 
@@ -81,7 +62,7 @@ int sleep_now(int fb) {
 int lcmt_handler(char* cmdline, int, char*) {
   if (line_starts_with(cmdline, "AT+LCMT=1")) {
     char extras[100];
-    const std::string_view colour = second_field(cmdline);
+    const std::string_view colour = comma_field(cmdline, 1);
     std::snprintf(extras, sizeof extras, "-e lcm_color %.*s", static_cast<int>(colour.size()),
                   colour.data());
     startActivityFromAtcid(kLcmTest, kLcmAction, extras);
@@ -96,11 +77,8 @@ int lcmt_handler(char* cmdline, int, char*) {
 
 int jvlcd_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVLCD=1")) return set_colour_type(cmdline);
-  if (line_is(cmdline, "AT+JVLCD=0")) {
-    ulda_nvram record;
-    if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-    return answer_quoted_int(response, record.lcm_color_type);
-  }
+  if (line_is(cmdline, "AT+JVLCD=0"))
+    return answer_record_int(__func__, response, &ulda_nvram::lcm_color_type);
   return REJECT_COMMAND_LINE(cmdline);
 }
 
@@ -120,10 +98,7 @@ int eslp_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+ESLP=0")) return REJECT_COMMAND_LINE(cmdline);
   constexpr const char* kMaxFreq = "/sys/devices/system/cpu/cpu0/cpufreq/scaling_max_freq";
   UniqueFd fd(dev_open(kMaxFreq, O_WRONLY | O_CREAT | O_TRUNC, 0666));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kMaxFreq);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kMaxFreq);
   return result_of(write_full(fd.get(), "800000", 6));
 }
 
@@ -159,7 +134,7 @@ int mmiccm_handler(char* cmdline, int, char*) {
         break;
       case CameraStep::kFocus:
         sendBroadcastFromAtcid(nullptr, "android.intent.action.AF", nullptr);
-        ::usleep(500000);  // the lens settles before the next step
+        sleep_ms(500);  // the lens settles before the next step
         break;
       case CameraStep::kCapture:
         sendBroadcastFromAtcid(nullptr, "android.intent.action.CAPTURE", nullptr);
@@ -179,7 +154,7 @@ int mmitw_handler(char* cmdline, int, char*) {
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+MMITW=0")) {
-    run_shell("/system/bin/sh -c \"input keyevent 4\"");  // Back closes the screen
+    run_sh_command("input keyevent 4");  // Back closes the screen
     return RESULT_OK;
   }
   return REJECT_COMMAND_LINE(cmdline);

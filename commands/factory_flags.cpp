@@ -8,6 +8,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/usb_adb.h"
 #include "commands/worker.h"
 #include "core/command.h"
@@ -21,18 +22,10 @@ std::atomic<bool> root_integrity_check_running{false};
 
 namespace {
 
-// The second comma-separated field, as strtok finds it (empty fields are skipped).
-std::string_view second_field(const char* cmdline) {
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  return next_token(rest, ",");
-}
-
 // Decimal digits only, within int32.
 bool parse_digits(std::string_view text, int32_t& value) {
-  if (text.empty()) return false;
-  const auto [end, ec] = std::from_chars(text.data(), text.data() + text.size(), value);
-  return ec == std::errc{} && end == text.data() + text.size() && text.front() != '-';
+  return all_digits(text) &&
+         std::from_chars(text.data(), text.data() + text.size(), value).ec == std::errc{};
 }
 
 // A 32-bit mask in decimal; bit 31 included.
@@ -42,21 +35,13 @@ bool parse_mask(std::string_view text, uint32_t& mask) {
   return ec == std::errc{} && end == text.data() + text.size();
 }
 
-int answer_record_int(const char* caller, char* response, int32_t ulda_nvram::*field) {
-  ulda_nvram record;
-  if (read_ulda_nvram(caller, record) != RESULT_OK) return RESULT_ERROR;
-  return answer_quoted_int(response, record.*field);
-}
-
 // "=1,<digits>" stores the number in the field.
 int store_digits(const char* caller, const char* cmdline, int32_t ulda_nvram::*field) {
-  const std::string_view param = second_field(cmdline);
+  const std::string_view param = comma_field(cmdline, 1);
   int32_t value = 0;
-  if (!parse_digits(param, value)) {
-    ATCI_LOGE("====this at wall paper id invalid:%.*s", static_cast<int>(param.size()),
-              param.data());
-    return RESULT_ERROR;
-  }
+  if (!parse_digits(param, value))
+    return LOGGED_ERROR("====this at wall paper id invalid:%.*s", static_cast<int>(param.size()),
+                        param.data());
   return update_ulda_nvram(caller, [&](ulda_nvram& r) {
     r.*field = value;
     ATCI_LOGD("=======set ulda_nvram field: %d", value);
@@ -78,9 +63,9 @@ void root_integrity_check_thread() {
     const WorkerCycle cycle;
     ATCI_LOGD("%s: Start", __func__);
     dev_unlink("/data/rooIntegityCheck.txt");
-    int ret = run_shell("/system/bin/sh -c \"richk > data/rooIntegityCheck.txt\"");
+    int ret = run_sh_command("richk > data/rooIntegityCheck.txt");
     ATCI_LOGD("ret%d", ret);
-    ret = run_shell("/system/bin/sh -c \"chmod 666 /data/rooIntegityCheck.txt\"");
+    ret = run_sh_command("chmod 666 /data/rooIntegityCheck.txt");
     ATCI_LOGD("ret%d", ret);
   }
   root_integrity_check_running.store(false, std::memory_order_release);
@@ -99,18 +84,16 @@ constexpr const char* kLogCaptures[] = {
     "logcat -v time > /data/adb.txt&",
 };
 
-// Kernel debug output of the audio codec and power management, then the log captures.
+// Kernel debug output of the audio codec and power management; the log captures follow.
 constexpr const char* kDebugLogCommands[] = {
-    "/system/bin/sh -c \"echo file wcd9320.c +p > /d/dynamic_debug/control\"",
-    "/system/bin/sh -c \"echo file wcd9xxx-common.c +p > /d/dynamic_debug/control\"",
-    "/system/bin/sh -c \"echo file wcd9xxx-mbhc.c +p > /d/dynamic_debug/control\"",
-    "/system/bin/sh -c \"echo file wcd9xxx-core.c +p > /d/dynamic_debug/control\"",
-    "/system/bin/sh -c \"echo file soc-dapm.c +p > /d/dynamic_debug/control\"",
-    "/system/bin/sh -c \"echo 0x21 > /sys/module/pm_8x60/parameters/debug_mask \"",
-    "/system/bin/sh -c \"echo 1 > /sys/kernel/debug/clk/debug_suspend\"",
-    "/system/bin/sh -c \"echo 1 > /sys/module/msm_show_resume_irq/parameters/debug_mask\"",
-    "/system/bin/sh -c \"cat /proc/kmsg > /data/log.txt&\"",
-    "/system/bin/sh -c \"logcat -v time > /data/adb.txt&\"",
+    "echo file wcd9320.c +p > /d/dynamic_debug/control",
+    "echo file wcd9xxx-common.c +p > /d/dynamic_debug/control",
+    "echo file wcd9xxx-mbhc.c +p > /d/dynamic_debug/control",
+    "echo file wcd9xxx-core.c +p > /d/dynamic_debug/control",
+    "echo file soc-dapm.c +p > /d/dynamic_debug/control",
+    "echo 0x21 > /sys/module/pm_8x60/parameters/debug_mask ",
+    "echo 1 > /sys/kernel/debug/clk/debug_suspend",
+    "echo 1 > /sys/module/msm_show_resume_irq/parameters/debug_mask",
 };
 
 }  // namespace
@@ -156,10 +139,8 @@ int jv3g_handler(char* cmdline, int, char* response) {
   property_get("sys.pemu.3g.nomal", value, "");
   ATCI_LOGD("============getprop:%s,ulda_nvram.nomal_3g:%d", value, record.nomal_3g);
   // An unset property reads as 0, as atoi reads it.
-  if (parse_long(value) != record.nomal_3g) {
-    ATCI_LOGE("========getprop != ulda_nvram.nomal_3g");
-    return RESULT_ERROR;
-  }
+  if (parse_long(value) != record.nomal_3g)
+    return LOGGED_ERROR("========getprop != ulda_nvram.nomal_3g");
   return answer_quoted_int(response, record.nomal_3g);
 }
 
@@ -167,7 +148,7 @@ int jvfeature_handler(char* cmdline, int, char* response) {
   const bool set = line_starts_with(cmdline, "AT+JVFEATURE=1");
   if (!set && !line_starts_with(cmdline, "AT+JVFEATURE=0")) return REJECT_COMMAND_LINE(cmdline);
   uint32_t mask = 0;
-  if (!parse_mask(second_field(cmdline), mask)) return RESULT_ERROR;
+  if (!parse_mask(comma_field(cmdline, 1), mask)) return RESULT_ERROR;
   if (set) {
     return update_ulda_nvram(__func__, [mask](ulda_nvram& r) {
       r.special_feature = static_cast<int32_t>(static_cast<uint32_t>(r.special_feature) | mask);
@@ -183,11 +164,11 @@ int jvfeature_handler(char* cmdline, int, char* response) {
 }
 
 int jvtestmmi_handler(char* cmdline, int, char*) {
-  const std::string_view order = second_field(cmdline);
+  const std::string_view order = comma_field(cmdline, 1);
   if (order.empty()) return RESULT_ERROR;
   ATCI_LOGD(" order=%.*s", static_cast<int>(order.size()), order.data());
   char text[sizeof ulda_nvram{}.test_order + 1];
-  std::snprintf(text, sizeof text, "%.*s", static_cast<int>(order.size()), order.data());
+  copy_field(text, order);
   bool written_back = false;
   const int status = update_ulda_nvram(__func__, [&](ulda_nvram& r) {
     set_ulda_string(r.test_order, text);
@@ -239,10 +220,8 @@ int jvefs_handler(char* cmdline, int, char*) {
 int jvrdnv_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+JVRDNV=0")) return REJECT_COMMAND_LINE(cmdline);
   ulda_nvram record;
-  if (get_ULDA_NV_item(&record) != 0) {
-    ATCI_LOGE("===system_init_flag_on_handler read nvram fail");
-    return RESULT_ERROR;
-  }
+  if (get_ULDA_NV_item(&record) != 0)
+    return LOGGED_ERROR("===system_init_flag_on_handler read nvram fail");
   return answer_quoted_int(response, record.is_jvsn_ok);
 }
 
@@ -265,7 +244,8 @@ int jvqlog_handler(char* cmdline, int, char* response) {
 
 int jvlogat_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVLOGAT=1")) return REJECT_COMMAND_LINE(cmdline);
-  for (const char* command : kDebugLogCommands) run_shell(command);
+  for (const char* command : kDebugLogCommands) run_sh_command("%s", command);
+  for (const char* capture : kLogCaptures) run_sh_command("%s", capture);
   property_set("com.pemu.atlog", "1");
   return RESULT_OK;
 }

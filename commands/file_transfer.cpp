@@ -15,6 +15,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"
@@ -135,19 +136,14 @@ int receive_file(const char* path, long long length) {
   ATCI_LOGD("write file %s", path);
   dev_unlink(FILE_TRANSFER_PARTIAL);
   UniqueFd file(dev_open(FILE_TRANSFER_PARTIAL, O_RDWR | O_CREAT | O_TRUNC | O_NOFOLLOW, 0666));
-  if (!file.ok()) {
-    ATCI_LOGE("create file error:%s ", std::strerror(errno));
-    return RESULT_ERROR;
-  }
+  if (!file.ok()) return LOGGED_ERROR("create file error:%s ", std::strerror(errno));
   if (!receive_content(file.get(), length) || ::fdatasync(file.get()) != 0 ||
       dev_rename(FILE_TRANSFER_PARTIAL, path) != 0) {
     dev_unlink(FILE_TRANSFER_PARTIAL);
     return RESULT_ERROR;
   }
   if (UniqueFd dir(dev_open("/data", O_RDONLY | O_DIRECTORY)); dir.ok()) ::fsync(dir.get());
-  char chmod[kPathSize + 32];
-  std::snprintf(chmod, sizeof chmod, "/system/bin/sh -c \"chmod 777 %s\"", path);
-  run_shell(chmod);
+  run_sh_command("chmod 777 %s", path);
   return RESULT_OK;
 }
 
@@ -164,30 +160,24 @@ int verify_file(const char* path, std::string_view expected, char* response) {
   for (size_t i = 0; i < sizeof digest; ++i) std::snprintf(hex + 2 * i, 3, "%02x", digest[i]);
   std::snprintf(response, RESPONSE_SIZE, "\"%s\"", hex);
   if (expected.size() >= 32 && strncasecmp(hex, expected.data(), 32) == 0) return RESULT_OK;
-  ATCI_LOGE("==verify error");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("==verify error");
 }
 
 }  // namespace
 
 int jvfile_handler(char* cmdline, int, char* response) {
   const bool receive = line_starts_with(cmdline, "AT+JVFILE=1");
-  if (!receive && !line_starts_with(cmdline, "AT+JVFILE=2")) {
-    ATCI_LOGE("==command invalid:%s", cmdline);
-    return RESULT_ERROR;
-  }
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  const std::string_view name = next_token(rest, ",");
-  const std::string_view second = next_token(rest, ",");
+  if (!receive && !line_starts_with(cmdline, "AT+JVFILE=2"))
+    return LOGGED_ERROR("==command invalid:%s", cmdline);
+  CommaFields fields(cmdline);
+  const std::string_view name = fields.next();
+  const std::string_view second = fields.next();
   if (name.empty() || second.empty()) return RESULT_ERROR;
   ATCI_LOGD("file_name=%.*s, %s=%.*s", static_cast<int>(name.size()), name.data(),
             receive ? "buff_len" : "md5", static_cast<int>(second.size()), second.data());
   char path[kPathSize];
-  if (!transfer_path(name, path)) {
-    ATCI_LOGE("refused file name: %.*s", static_cast<int>(name.size()), name.data());
-    return RESULT_ERROR;
-  }
+  if (!transfer_path(name, path))
+    return LOGGED_ERROR("refused file name: %.*s", static_cast<int>(name.size()), name.data());
   if (!receive) return verify_file(path, second, response);
   long long length = 0;
   if (!parse_length(second, length)) return RESULT_ERROR;

@@ -11,6 +11,7 @@
 
 #include "commands/battery.h"
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
@@ -58,10 +59,7 @@ int gps_open_handler(uint8_t option) {
     return RESULT_OK;
   }
   ATCI_LOGD("========gps first  open\n");
-  if (gps_option(option) != 0) {
-    ATCI_LOGE("======send qmi msg fail\n");
-    return RESULT_ERROR;
-  }
+  if (gps_option(option) != 0) return LOGGED_ERROR("======send qmi msg fail\n");
   gps_open = true;
   return RESULT_OK;
 }
@@ -70,10 +68,7 @@ int gps_close_handler() {
   ATCI_LOGD("========gps first close\n");
   {
     const std::lock_guard step(gps_poll_lock);
-    if (gps_option(0) != 0) {
-      ATCI_LOGE("======send qmi msg fail\n");
-      return RESULT_ERROR;
-    }
+    if (gps_option(0) != 0) return LOGGED_ERROR("======send qmi msg fail\n");
     gps_open = false;
     gps_thread_exit = true;
   }
@@ -106,12 +101,9 @@ constexpr const char* kSoundDevice = "sys/devices/virtual/misc/msm_snd/device";
 // The sound driver's device file routes the tuner's audio; it must be there to be written.
 int route_fm_audio(const char* command) {
   UniqueFd device(dev_open(kSoundDevice, O_RDONLY | O_CLOEXEC));
-  if (!device.ok()) {
-    ATCI_LOGE("=====%s is not exist\n", kSoundDevice);
-    return RESULT_ERROR;
-  }
+  if (!device.ok()) return LOGGED_ERROR("=====%s is not exist\n", kSoundDevice);
   device.reset();
-  run_shell(command);
+  run_sh_command("%s", command);
   return RESULT_OK;
 }
 
@@ -150,23 +142,19 @@ int gps_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVGPS=3")) return gps_open_handler(3);
   if (line_is(cmdline, "AT+JVGPS=0")) return gps_close_handler();
   if (line_is(cmdline, "AT+JVGPS=2") && gps_open) return gps_stream_handler();
-  ATCI_LOGE("====this at command invalid:%s====\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("====this at command invalid:%s====\r\n", cmdline);
 }
 
 int locate_access_on_handler(char* cmdline, int, char*) {
-  if (!line_is(cmdline, "AT+JVDW=1")) {
-    ATCI_LOGE("**********this at command invalid:%s***********\r\n", cmdline);
-    return RESULT_ERROR;
-  }
+  if (!line_is(cmdline, "AT+JVDW=1"))
+    return LOGGED_ERROR("**********this at command invalid:%s***********\r\n", cmdline);
   sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 3");
   // The phone records its track meanwhile; the station waits for the answer.
   ::sleep(80);
   sendBroadcastFromAtcid(nullptr, kKeepScreenOn, "-e status 4");
-  if (dev_access("/data/lcn", R_OK | W_OK) != 0) {
-    ATCI_LOGE("===========LOCATING_TRACKING_PATH WR_OK Fial:%s===========\r\n", "/data/lcn");
-    return RESULT_ERROR;
-  }
+  if (dev_access("/data/lcn", R_OK | W_OK) != 0)
+    return LOGGED_ERROR("===========LOCATING_TRACKING_PATH WR_OK Fial:%s===========\r\n",
+                        "/data/lcn");
   sendBroadcastFromAtcid("com.ulda.engineermode/.ConnWifiReceiver",
                          "kro.intent.action.DISCONNWIFI", nullptr);
   return RESULT_OK;
@@ -177,7 +165,7 @@ int fm_test_handler(char* cmdline, int, char* response) {
     if (fm_tuner_fd >= 0) ::close(fm_tuner_fd);
     fm_tuner_fd = -1;
     return route_fm_audio(
-        "/system/bin/sh -c \"echo 6 1 1 > /sys/devices/virtual/misc/msm_snd/device\"");
+        "echo 6 1 1 > /sys/devices/virtual/misc/msm_snd/device");
   }
   if (line_is(cmdline, "AT+JVFM=2")) {
     if (fm_tuner_fd < 0) return RESULT_ERROR;
@@ -188,15 +176,13 @@ int fm_test_handler(char* cmdline, int, char* response) {
   }
   if (line_is(cmdline, "AT+JVFM=3")) {
     if (headset_plugged()) return RESULT_OK;
-    ATCI_LOGE("Headset has not benn pluged.");
-    return RESULT_ERROR;
+    return LOGGED_ERROR("Headset has not benn pluged.");
   }
   if (line_starts_with(cmdline, "AT+JVFM=1")) {
     if (fm_tuner_fd >= 0) return RESULT_OK;
     fm_tuner_fd = dev_open("/dev/radio0", O_RDWR | O_CLOEXEC);
     return route_fm_audio(
-        "/system/bin/sh -c \"echo 26 0 1 > /sys/devices/virtual/misc/msm_snd/device\"");
+        "echo 26 0 1 > /sys/devices/virtual/misc/msm_snd/device");
   }
-  ATCI_LOGE("=====this at command invalid:%s\r\n", cmdline);
-  return RESULT_ERROR;
+  return LOGGED_ERROR("=====this at command invalid:%s\r\n", cmdline);
 }

@@ -1,6 +1,5 @@
 #include "commands/identity.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -10,6 +9,7 @@
 #include <unistd.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -64,20 +64,11 @@ int write_nv_item(uint32_t item, uint8_t option, const char* value, const char* 
   return RESULT_OK;
 }
 
-void copy_field(std::string_view field, char (&out)[CMD_LINE_SIZE]) {
-  const size_t length = std::min(field.size(), sizeof out - 1);
-  field.copy(out, length);
-  out[length] = '\0';
-}
-
-// The `index`th ","-field as strtok finds it (empty fields skipped), normalised by substring
-// into `out`. False when the field is missing or nothing is left of it.
+// Parameter `index` normalised by substring into `out`. False when the field is missing or
+// nothing is left of it.
 bool normalised_field(const char* cmdline, int index, const char* value_name,
                       char (&out)[CMD_LINE_SIZE]) {
-  std::string_view rest(cmdline);
-  std::string_view field;
-  for (int i = 0; i <= index; ++i) field = next_token(rest, ",");
-  copy_field(field, out);
+  copy_field(out, comma_field(cmdline, index));
   ATCI_LOGD("===========Before %s:%s\r\n", value_name, out);
   substring(out);
   ATCI_LOGD("===========After %s:%s\r\n", value_name, out);
@@ -118,10 +109,8 @@ int nv_item_command(const NvItemCommand& command, char* cmdline, char* response)
   if (line_is(cmdline, command.read_line)) return read_nv_item(command.item, 0, response);
   if (!line_starts_with(cmdline, command.write_prefix)) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 1, command.value_name, value)) {
-    ATCI_LOGE("%s", command.missing_log);
-    return RESULT_ERROR;
-  }
+  if (!normalised_field(cmdline, 1, command.value_name, value))
+    return LOGGED_ERROR("%s", command.missing_log);
   return write_nv_item(command.item, 0, value, command.request_name);
 }
 
@@ -143,16 +132,15 @@ struct KeyCommand {
 };
 
 constexpr KeyCommand kKeyCommands[] = {
-    {"AT+PEMUKP=1,genkey", "/system/bin/sh -c \"/data/pemukp --genkey&\"", KeyStep::kBackground,
+    {"AT+PEMUKP=1,genkey", "/data/pemukp --genkey&", KeyStep::kBackground, "==genkey fail \r\n"},
+    {"AT+PEMUKP=1,keysaved", "/data/pemukp --keysaved> /data/RSAtemp", KeyStep::kSavedCheck,
+     "==keysaved fail \r\n"},
+    {"AT+PEMUKP=1,getkey", "/data/pemukp --getkey > /data/RSAtemp", KeyStep::kReadText,
+     "==getkey fail \r\n"},
+    {"AT+PEMUKP=1,genuniqueid", "/data/pemukp --genuniqueid&", KeyStep::kBackground,
      "==genkey fail \r\n"},
-    {"AT+PEMUKP=1,keysaved", "/system/bin/sh -c \"/data/pemukp --keysaved> /data/RSAtemp\"",
-     KeyStep::kSavedCheck, "==keysaved fail \r\n"},
-    {"AT+PEMUKP=1,getkey", "/system/bin/sh -c \"/data/pemukp --getkey > /data/RSAtemp\"",
-     KeyStep::kReadText, "==getkey fail \r\n"},
-    {"AT+PEMUKP=1,genuniqueid", "/system/bin/sh -c \"/data/pemukp --genuniqueid&\"",
-     KeyStep::kBackground, "==genkey fail \r\n"},
-    {"AT+PEMUKP=1,getuniqueid", "/system/bin/sh -c \"/data/pemukp --getuniqueid > /data/RSAtemp\"",
-     KeyStep::kReadText, "==getkey fail \r\n"},
+    {"AT+PEMUKP=1,getuniqueid", "/data/pemukp --getuniqueid > /data/RSAtemp", KeyStep::kReadText,
+     "==getkey fail \r\n"},
 };
 
 // The shell could not run the command at all: no shell, or no such program.
@@ -162,13 +150,12 @@ bool shell_could_not_run(int status) {
 
 // Reads the tool's output once and deletes it; -1 when it cannot be read (it is then left).
 ssize_t read_key_scratch(char* buf, size_t limit) {
-  std::memset(buf, 0, limit + 1);
   UniqueFd fd(dev_open(kKeyScratch, O_RDONLY));
   if (fd.get() == 0) {
     ATCI_LOGE("==open fail \r\n");
     return -1;
   }
-  const ssize_t n = fd.ok() ? ::read(fd.get(), buf, limit) : -1;
+  const ssize_t n = read_head(fd.get(), buf, limit);  // a failed open fails here
   if (n < 0) {
     ATCI_LOGE("==read fail \r\n");
     return -1;
@@ -179,7 +166,7 @@ ssize_t read_key_scratch(char* buf, size_t limit) {
 }
 
 int run_key_command(const KeyCommand& command, char* response) {
-  if (shell_could_not_run(run_shell(command.shell))) {
+  if (shell_could_not_run(run_sh_command("%s", command.shell))) {
     ATCI_LOGE("%s", command.fail_log);
     // The background variants answer UNKNOWN, as stations expect.
     return command.step == KeyStep::kReadText ? RESULT_ERROR : -1;
@@ -247,10 +234,8 @@ int imei_and_pcb_code_on_handler(char* cmdline, int, char* response) {
   const bool barcode = !imei && !imei_with_options && line_starts_with(cmdline, "AT+EGMR=1,5");
   if (!imei && !imei_with_options && !barcode) return REJECT_COMMAND_LINE(cmdline);
   char value[CMD_LINE_SIZE];
-  if (!normalised_field(cmdline, 2, "barcode", value)) {
-    ATCI_LOGE("========Barcode is NULL\n");
-    return RESULT_ERROR;
-  }
+  if (!normalised_field(cmdline, 2, "barcode", value))
+    return LOGGED_ERROR("========Barcode is NULL\n");
   const uint32_t item = barcode ? kBarcodeItem : kImeiItem;
   if (write_nv_item(item, imei_with_options ? 1 : 0, value, "data_req_for_put_nv") != RESULT_OK)
     return RESULT_ERROR;
@@ -277,16 +262,13 @@ int property_set_handler(char* cmdline, int, char* response) {
   ATCI_LOGD("cmdline %s\r\n", cmdline);
   if (line_starts_with(cmdline, "AT+JVPROP=1")) return set_named_property(cmdline, response);
   if (line_starts_with(cmdline, "AT+JVPROP=0")) {
-    std::string_view rest(cmdline);
-    next_token(rest, ",");
-    const std::string_view field = next_token(rest, ",");
+    const std::string_view field = comma_field(cmdline, 1);
     if (field.empty()) return RESULT_ERROR;
     char name[CMD_LINE_SIZE];
-    copy_field(field, name);
+    copy_field(name, field);
     lower_ascii(name);
     property_get(name, response, "NULL");
     return RESULT_OK;
   }
-  ATCI_LOGE("invalid command\r\n");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("invalid command\r\n");
 }

@@ -11,6 +11,7 @@
 
 #include "commands/command_util.h"
 #include "commands/device_info.h"
+#include "commands/shell.h"
 #include "commands/worker.h"
 #include "core/transport.h"
 #include "platform/platform.h"
@@ -86,7 +87,7 @@ void indicate_lights_body() {
       write_int(counter % 2 == 0 ? kRedLed : green, 255);
     }
     if (g_indicate_lights.stop) break;
-    ::usleep(500000);
+    sleep_ms(500);
   }
   const WorkerCycle cycle;
   write_int(kRedLed, 0);
@@ -128,10 +129,7 @@ int set_flashlight(const char* path, int state, const char* on_text) {
 // The level of "AT+EDFT=0,5,<level>": decimal digits worth at most 255, else -1.
 int backlight_level(const char* cmdline) {
   if (line_is(cmdline, "AT+EDFT=0,5")) return 255;
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  next_token(rest, ",");
-  const std::string_view field = next_token(rest, ",");
+  const std::string_view field = comma_field(cmdline, 2);
   unsigned value = 0;
   const auto [end, error] = std::from_chars(field.data(), field.data() + field.size(), value);
   if (field.empty() || error != std::errc() || end != field.data() + field.size() || value > 255)
@@ -146,25 +144,18 @@ int display_on() {
   const bool oled = is_any_model(kOledModels);
   if (!oled && !is_product_model("QM0304A")) return RESULT_OK;
   UniqueFd fd(dev_open(kFrameBuffer, O_RDWR));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kFrameBuffer);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kFrameBuffer);
   g_display_fd = std::move(fd);
   if (oled) {
-    run_shell("/system/bin/sh -c \"chmod 666 /sys/lcm/oled_pixelon\"");
-    run_shell("/system/bin/sh -c \"echo \"1\" > /sys/lcm/oled_pixelon\"");
-    run_shell("/system/bin/sh -c \"chmod 444 /sys/lcm/oled_pixelon\"");
+    run_sh_commands({"chmod 666 /sys/lcm/oled_pixelon", "echo \"1\" > /sys/lcm/oled_pixelon",
+                     "chmod 444 /sys/lcm/oled_pixelon"});
   }
   return RESULT_OK;
 }
 
 int display_off() {
   UniqueFd fd(dev_open(kFrameBuffer, O_RDWR));
-  if (!fd.ok()) {
-    ATCI_LOGE("cannot open %s", kFrameBuffer);
-    return RESULT_ERROR;
-  }
+  if (!fd.ok()) return LOGGED_ERROR("cannot open %s", kFrameBuffer);
   if (platform_fb_blank(fd.get(), PLATFORM_FB_BLANK_POWERDOWN) != 0) ATCI_LOGE("FBIOBLANK failed");
   return RESULT_OK;
 }
@@ -320,8 +311,8 @@ int jvsp_handler(char* cmdline, int, char*) {
 
 int jvbs_handler(char* cmdline, int, char*) {
   if (line_is(cmdline, "AT+JVBS=1")) {
-    run_shell("/system/bin/sh -c \"touch /data/data/com.ulda.engineermode/keepScreenOn\"");
-    run_shell("/system/bin/sh -c \"chmod 0666 /data/data/com.ulda.engineermode/keepScreenOn\"");
+    run_sh_commands({"touch /data/data/com.ulda.engineermode/keepScreenOn",
+                     "chmod 0666 /data/data/com.ulda.engineermode/keepScreenOn"});
     if (is_sp == 0) keep_screen_on_broadcast("-e status 3");
     return RESULT_OK;
   }

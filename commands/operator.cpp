@@ -1,6 +1,5 @@
 #include "commands/operator.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -141,10 +140,7 @@ int set_optr_flag(const char* flag, char* response) {
     if (store_optr_flag(flag) != RESULT_OK) return RESULT_ERROR;
     return answer_quoted(response, answer);
   }
-  if (text.size() != 2) {
-    ATCI_LOGE("optr flag error : %s", flag);
-    return RESULT_ERROR;
-  }
+  if (text.size() != 2) return LOGGED_ERROR("optr flag error : %s", flag);
   if (store_optr_flag(flag) != RESULT_OK) return RESULT_ERROR;
   if (write_region_code(flag) != 0) return answer_region_failure(response);
   if (dir_has_entry(kInternalCard, "oem", flag) || dir_has_entry(kExternalCard, "oem", flag)) {
@@ -222,16 +218,10 @@ int write_region_code(const char* flag) {
 
 int optr_flag_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVOPTR=1")) {
-    std::string_view rest(cmdline);
-    next_token(rest, ",");
-    const std::string_view flag = next_token(rest, ",");
-    if (flag.empty()) {
-      ATCI_LOGE("optr flag is NULL");
-      return RESULT_ERROR;
-    }
+    const std::string_view flag = comma_field(cmdline, 1);
+    if (flag.empty()) return LOGGED_ERROR("optr flag is NULL");
     char text[CMD_LINE_SIZE];
-    flag.copy(text, sizeof text - 1);
-    text[std::min(flag.size(), sizeof text - 1)] = '\0';
+    copy_field(text, flag);
     return set_optr_flag(text, response);
   }
   if (line_is(cmdline, "AT+JVOPTR=0")) {
@@ -250,10 +240,7 @@ int check_oem_handler(char* cmdline, int, char*) {
   char oem_version[PROPERTY_VALUE_MAX];
   property_get("ro.oem.version", oem_version, "");
   ATCI_LOGD("===========ro.oem.version: %s", oem_version);
-  if (oem_version[0] == '\0') {
-    ATCI_LOGE("oem version is null");
-    return RESULT_ERROR;
-  }
+  if (oem_version[0] == '\0') return LOGGED_ERROR("oem version is null");
   ulda_nvram record;
   if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
   StoredFlag flag;

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/storage.h"
 #include "core/command.h"
 #include "core/log.h"
@@ -29,18 +30,16 @@ constexpr const char* kUpdateReceiver = "com.ulda.engineermode/.UpdateSWReceiver
 constexpr const char* kUpdateAction = "android.flashOP.UpdateSW";
 constexpr size_t kRecoveryTextMax = 255;
 
-void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
-
 // The phone is about to go away: the station hears OK now or never. The update commands
 // answer with a blank line before the word, the power commands without.
 void early_answer_line(const char* cmdline) { write_early_answer(cmdline, "OK", true); }
 
 void ensure_recovery_dir() {
-  if (dev_access(kRecoveryDir, F_OK) != 0) run_shell("/system/bin/sh -c \"mkdir /cache/recovery\"");
+  if (dev_access(kRecoveryDir, F_OK) != 0) run_sh_command("mkdir /cache/recovery");
 }
 
 // Recovery reads the command file at its next start.
-void reboot_recovery() { run_shell("/system/bin/sh -c \"reboot recovery\""); }
+void reboot_recovery() { run_sh_command("reboot recovery"); }
 
 // Writes all of `data` over the start of the command file; the tail of a longer earlier
 // command stays.
@@ -64,17 +63,12 @@ int master_clear() {
   ensure_recovery_dir();
   {
     UniqueFd file(dev_open(kRecoveryCommand, O_WRONLY | O_CREAT | O_TRUNC, 0666));
-    if (!file.ok()) {
-      ATCI_LOGE("fail to open /cache/recovery/command");
-      return RESULT_ERROR;
-    }
+    if (!file.ok()) return LOGGED_ERROR("fail to open /cache/recovery/command");
     // Recovery reads the terminating NUL too.
     static constexpr char kWipe[] = "--wipe_data";
     static_assert(sizeof kWipe == 12);
-    if (::write(file.get(), kWipe, sizeof kWipe) != static_cast<ssize_t>(sizeof kWipe)) {
-      ATCI_LOGE("fail to write /cache/recovery/command");
-      return RESULT_ERROR;
-    }
+    if (::write(file.get(), kWipe, sizeof kWipe) != static_cast<ssize_t>(sizeof kWipe))
+      return LOGGED_ERROR("fail to write /cache/recovery/command");
   }
   const int status = update_ulda_nvram("master_clear", [](ulda_nvram& r) {
     ATCI_LOGD("=======set ulda_nvram.master_clear_flag: %d,%d", r.adb_flag, 13);
@@ -90,9 +84,7 @@ int master_clear() {
 }
 
 int install_operator_package(const char* cmdline, char* response) {
-  std::string_view rest(cmdline);
-  next_token(rest, ",");
-  const std::string_view name = next_token(rest, ",");
+  const std::string_view name = comma_field(cmdline, 1);
   if (name.empty()) return RESULT_ERROR;
   char path[CMD_LINE_SIZE + 32];
   std::snprintf(path, sizeof path, "/storage/sdcard0/oem_%.*s.zip", static_cast<int>(name.size()),
@@ -155,10 +147,8 @@ int update_apps_only(const char* cmdline, char* response) {
   if (!app_version_matches(response)) return RESULT_ERROR;
   ATCI_LOGD("update apps only");
   static constexpr char kUpdateApp[] = "--update_app";
-  if (!overwrite_recovery_command(kUpdateApp, sizeof kUpdateApp - 1)) {
-    ATCI_LOGE("======write the file fail");
-    return RESULT_ERROR;
-  }
+  if (!overwrite_recovery_command(kUpdateApp, sizeof kUpdateApp - 1))
+    return LOGGED_ERROR("======write the file fail");
   if (set_restore_flag() != 1 || clear_sdcard("update_app") != 1) return RESULT_ERROR;
   early_answer_line(cmdline);
   sleep_ms(3000);
@@ -238,9 +228,7 @@ int jvreboot_handler(char* cmdline, int, char*) {
 int jvrt_handler(char* cmdline, int, char* response) {
   if (line_is(cmdline, "AT+JVRT=1")) return master_clear();
   if (!line_is(cmdline, "AT+JVRT=0")) return REJECT_COMMAND_LINE(cmdline);
-  ulda_nvram record;
-  if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-  return answer_quoted_int(response, record.master_clear_flag);
+  return answer_record_int(__func__, response, &ulda_nvram::master_clear_flag);
 }
 
 int jvrtall_handler(char* cmdline, int, char* response) {

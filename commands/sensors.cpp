@@ -82,10 +82,7 @@ int gsensor_calibrate() {
 
 int start_z_stream() {
   gsensor_test_exit = false;
-  if (gsensor_z_thread.load() != NO_THREAD) {
-    ATCI_LOGE("g-sensor stream already recorded");
-    return RESULT_ERROR;
-  }
+  if (gsensor_z_thread.load() != NO_THREAD) return LOGGED_ERROR("g-sensor stream already recorded");
   pthread_t thread;
   if (start_worker(&thread, gsensor_z_body, true) != 0) return RESULT_ERROR;
   gsensor_z_thread = thread;

@@ -7,10 +7,10 @@
 #include <strings.h>
 #include <sys/stat.h>
 #include <sys/statfs.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "platform/platform.h"
@@ -228,15 +228,15 @@ int answer_sizes(char* response, double total_gb, double used_mb) {
 
 // Megabytes in use on the emulated storage, as du counts them.
 bool emulated_storage_used_mb(double& used_mb) {
-  run_shell("/system/bin/sh -c \"du -sk /storage/sdcard0/ > /data/udroom\"");
   char line[128];
-  const bool read = read_first_line("/data/udroom", line, sizeof line) == 0;
+  const bool read =
+      sh_first_line("du -sk /storage/sdcard0/", "/data/udroom", line, sizeof line) > 0;
   if (read) {
     const std::string_view text(line);
     used_mb = static_cast<double>(parse_long(text.substr(0, text.find('\t')))) * 0.0009765625;
   }
   // Removes the OTG scratch file, not /data/udroom: the phone has always done so.
-  run_shell("/system/bin/sh -c \"rm /data/getevent\"");
+  run_sh_command("rm /data/getevent");
   return read;
 }
 
@@ -290,25 +290,20 @@ void traversal_directory(const char* path, int* dirs, int* files) {
 int tfst_handler(char* cmdline, int, char* response) {
   if (!line_is(cmdline, "AT+TFST=0")) return REJECT_COMMAND_LINE(cmdline);
   char version[32];
-  UniqueFile file(dev_fopen("/mnt/sdcard/.sdcard_version", "r"));
-  if (!file) file.reset(dev_fopen("/storage/sdcard1/.sdcard_version", "r"));
-  if (!file || std::fgets(version, sizeof version, file.get()) == nullptr) {
-    ATCI_LOGE("no memory card version file");
-    return RESULT_ERROR;
-  }
+  int length = read_first_line("/mnt/sdcard/.sdcard_version", version, sizeof version);
+  if (length < 0)
+    length = read_first_line("/storage/sdcard1/.sdcard_version", version, sizeof version);
+  if (length <= 0) return LOGGED_ERROR("no memory card version file");
   return answer_quoted(response, version);
 }
 
 int jvsd_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVSD=0")) return REJECT_COMMAND_LINE(cmdline);
-  run_shell("/system/bin/sh -c \"cat /proc/mounts > /sdcard/mount.txt\"");
+  run_sh_command("cat /proc/mounts > /sdcard/mount.txt");
   char mounts[4097];
   const ssize_t count = read_file_head("/sdcard/mount.txt", mounts, sizeof mounts - 1);
   dev_unlink("/sdcard/mount.txt");
-  if (count < 1) {
-    ATCI_LOGE("cannot read /sdcard/mount.txt");
-    return RESULT_ERROR;
-  }
+  if (count < 1) return LOGGED_ERROR("cannot read /sdcard/mount.txt");
   char emulate[PROPERTY_VALUE_MAX];
   property_get("persist.sys.primary.emulate", emulate, "0");
   const std::string_view text(mounts);
@@ -329,7 +324,7 @@ int jvudwr_handler(char* cmdline, int, char*) {
 
 int jvotg_handler(char* cmdline, int, char*) {
   if (!line_is(cmdline, "AT+JVOTG=1")) return REJECT_COMMAND_LINE(cmdline);
-  run_shell("/system/bin/sh -c \"ls /dev/input > /data/getevent\"");
+  run_sh_command("ls /dev/input > /data/getevent");
   bool mouse = false;
   if (UniqueFile file{dev_fopen("/data/getevent", "r")}) {
     char line[1024];
@@ -340,7 +335,7 @@ int jvotg_handler(char* cmdline, int, char*) {
   } else {
     ATCI_LOGE("cannot open /data/getevent");
   }
-  run_shell("/system/bin/sh -c \"rm /data/getevent\"");
+  run_sh_command("rm /data/getevent");
   return result_of(mouse);
 }
 
@@ -399,17 +394,14 @@ int jvfn_handler(char* cmdline, int, char* response) {
 }
 
 int jvsdcali_handler(char* cmdline, int, char* response) {
-  if (line_is(cmdline, "AT+JVSDCALI=0")) {
-    ulda_nvram record;
-    if (read_ulda_nvram(__func__, record) != RESULT_OK) return RESULT_ERROR;
-    return answer_quoted_int(response, record.sdcard_cali_flag);
-  }
+  if (line_is(cmdline, "AT+JVSDCALI=0"))
+    return answer_record_int(__func__, response, &ulda_nvram::sdcard_cali_flag);
   if (!line_is(cmdline, "AT+JVSDCALI=1")) return REJECT_COMMAND_LINE(cmdline);
   return update_ulda_nvram(__func__, [](ulda_nvram& record) {
     struct statfs before {};
     struct statfs after {};
     if (dev_statfs(SDCARD_ROOT, &before) != 0) return false;
-    if (!shell_succeeded(run_shell("/system/bin/sh -c \"vdc volume calibrate /storage/sdcard0\"")))
+    if (!shell_succeeded(run_sh_command("vdc volume calibrate /storage/sdcard0")))
       return false;
     if (dev_statfs(SDCARD_ROOT, &after) != 0) return false;
     const auto bytes = [](const struct statfs& st) {

@@ -10,6 +10,7 @@
 #include <memory>
 
 #include "commands/command_util.h"
+#include "commands/shell.h"
 #include "commands/worker.h"
 #include "core/command.h"
 #include "core/log.h"
@@ -26,8 +27,6 @@ constexpr const char* kDebugUsbFunctions = "diag,serial_smd,serial_tty,rmnet_bam
 constexpr const char* kUsbOnline = "/sys/class/power_supply/usb/online";
 constexpr size_t kScratchSize = 2 * 1024 * 1024;
 
-void sleep_ms(unsigned ms) { ::usleep(ms * 1000); }
-
 // One look at the cable: the pause before the next look in milliseconds, or 0 once it was
 // pulled and the phone told to shut down. A node that cannot be read is looked at again after
 // a second, so it never makes the watch spin.
@@ -38,8 +37,8 @@ unsigned look_at_usb_cable() {
     ATCI_LOGE("fail to open online");
     return 1000;
   }
-  char state[6] = {};
-  if (::read(online.get(), state, 5) < 0) {
+  char state[6];
+  if (read_head(online.get(), state, 5) < 0) {
     ATCI_LOGE("fail to read online");
     return 1000;
   }
@@ -108,7 +107,7 @@ int close_adb(const char* cmdline) {
   // The receiver listens for this spelling.
   sendBroadcastFromAtcid(nullptr, "android.intent.ACTION_AT_RESERT_NETWORK_MODE", nullptr);
   sleep_ms(1000);
-  run_shell("/system/bin/sh -c \"rm -r /storage/sdcard0/ram_dump\"");
+  run_sh_command("rm -r /storage/sdcard0/ram_dump");
   property_set("persist.sys.dloadmode", "0");
 
   // Switching to charging removes the USB serial function and the port with it: the station
@@ -118,7 +117,7 @@ int close_adb(const char* cmdline) {
   property_set(kUsbConfig, "charging");
   ATCI_LOGD("close wifi");
   sendBroadcastFromAtcid(nullptr, "android.intent.action.RESTART_ATCID", "--ei em 4");
-  run_shell("/system/bin/sh -c \"rm /cache/recovery/last_ssid_pwd\"");
+  run_sh_command("rm /cache/recovery/last_ssid_pwd");
   return 1;
 }
 
@@ -140,10 +139,7 @@ int jvadb_handler(char* cmdline, int, char* response) {
     return result_of(closed);
   }
   if (line_is(line, "AT+JVADB=0,1")) {
-    if (close_adb(line) != 1) {
-      ATCI_LOGE("===== close adb fail");
-      return RESULT_ERROR;
-    }
+    if (close_adb(line) != 1) return LOGGED_ERROR("===== close adb fail");
     ATCI_LOGD("===== close adb success");
     sendBroadcastFromAtcid(nullptr, "kro.intent.action.AT_SHUT_DOWN", nullptr);
     return RESULT_OK;

@@ -12,7 +12,7 @@
 #include <strings.h>
 
 #include "commands/command_util.h"
-#include "commands/radio_util.h"
+#include "commands/shell.h"
 #include "core/command.h"
 #include "core/log.h"
 #include "core/transport.h"
@@ -113,26 +113,15 @@ constexpr size_t kCommandSize = 100;
 constexpr const char* kLoadWlan = "insmod /system/lib/modules/wlan.ko con_mode=5 ";
 constexpr const char* kTxPowerFile = "/data/wlanTxPower";
 
-
-template <typename... Args>
-void runf(const char* format, Args... args) {
-  char command[kCommandSize];
-  std::snprintf(command, sizeof command, format, args...);
-  run_tool(command);
-}
-
-// The second ":"-field of the first line of a driver output file, at most size - 1 characters
-// read. False, and logged, when the file cannot be opened or the field is missing; the file is
-// removed only once the value was read.
-bool read_driver_value(const char* file, size_t size, const char* missing_log, char* value) {
-  char line[kCommandSize] = {};
-  {
-    UniqueFile f(dev_fopen(file, "r"));
-    if (!f) {
-      ATCI_LOGE("===the file %s is NULL\r\n", file);
-      return false;
-    }
-    if (std::fgets(line, static_cast<int>(size), f.get()) == nullptr) line[0] = '\0';
+// The second ":"-field of the first line a driver tool writes to `file`, at most size - 1
+// characters read. False, and logged, when the file cannot be opened or the field is missing;
+// the file is removed only once the value was read.
+bool read_driver_value(const char* tool, const char* file, size_t size, const char* missing_log,
+                       char (&value)[kCommandSize]) {
+  char line[kCommandSize];
+  if (sh_first_line(tool, file, line, size) < 0) {
+    ATCI_LOGE("===the file %s is NULL\r\n", file);
+    return false;
   }
   std::string_view rest(line);
   next_token(rest, ":");
@@ -141,22 +130,19 @@ bool read_driver_value(const char* file, size_t size, const char* missing_log, c
     ATCI_LOGE("%s", missing_log);
     return false;
   }
-  std::snprintf(value, kCommandSize, "%.*s", static_cast<int>(field.size()), field.data());
-  runf("rm %s", file);
+  copy_field(value, field);
+  run_sh_command("rm %s", file);
   return true;
 }
 
 // The power the driver reports for the current channel, as its raw integer.
-bool read_tx_power(const char* missing_log, char* value) {
-  run_tool("iwpriv wlan0 get_chpower > /data/wlanTxPower");
-  return read_driver_value(kTxPowerFile, 50, missing_log, value);
+bool read_tx_power(const char* missing_log, char (&value)[kCommandSize]) {
+  return read_driver_value("iwpriv wlan0 get_chpower", kTxPowerFile, 50, missing_log, value);
 }
 
 // A field as a terminated string for the C conversions.
 struct FieldText {
-  explicit FieldText(std::string_view field) {
-    std::snprintf(text, sizeof text, "%.*s", static_cast<int>(field.size()), field.data());
-  }
+  explicit FieldText(std::string_view field) { copy_field(text, field); }
   char text[CMD_LINE_SIZE];
 };
 
@@ -201,15 +187,12 @@ int wlan_init() {
     sendBroadcastFromAtcid(nullptr, "kro.intent.action.KEEP_CREEN_ON", "-e status 2");
     ATCI_LOGD("end JVWLAN=1 KEEP_CREEN_ON 2");
   }
-  run_tool("rmmod cfg80211");
-  run_tool("rmmod wlan");
-  run_tool("insmod /system/lib/modules/cfg80211.ko");
-  run_tool("echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode");
-  run_tool(kLoadWlan);
+  run_sh_commands({"rmmod cfg80211", "rmmod wlan", "insmod /system/lib/modules/cfg80211.ko",
+                   "echo 5 >  /sys/module/wcnsscore/parameters/wlan_eng_mode", kLoadWlan});
   ::sleep(2);
   if (check_driver_loaded("wlan") == 0) {
     ATCI_LOGE("wlan modules unloaded, try to load again!");
-    run_tool(kLoadWlan);
+    run_sh_command("%s", kLoadWlan);
     ::usleep(200);
   }
   char mode[50];
@@ -225,12 +208,10 @@ int wlan_transmit(const char* cmdline, bool wide) {
   const std::string_view rate = fields.next();
   const std::string_view power = fields.next();
   const std::string_view bonding = wide ? fields.next() : std::string_view();
-  if (channel.empty() || rate.empty() || power.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (channel.empty() || rate.empty() || power.empty())
+    return LOGGED_ERROR("Parameters incomplete.");
   power_is_off = false;
-  char power_cmd[kCommandSize] = {};
+  int power_value = 0;
   const FieldText power_text(power);
   if (std::strcmp(power_text.text, "OFF") == 0 || std::strcmp(power_text.text, "off") == 0) {
     power_is_off = true;
@@ -241,27 +222,21 @@ int wlan_transmit(const char* cmdline, bool wide) {
 
   if (!wide && check_driver_loaded("wlan") == 0) {
     ATCI_LOGE("wlan modules unloaded, try to load!");
-    run_tool(kLoadWlan);
+    run_sh_command("%s", kLoadWlan);
     ::usleep(200);
   }
-  run_tool("iwpriv wlan0 tx 0");
-  run_tool("iwpriv wlan0 ftm 0");
-  if (!power_is_off)
-    std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_txpower %d",
-                  static_cast<int>(std::atof(power_text.text) * 100));
-  if (!wide) ::usleep(200 * 1000);
-  run_tool("iwpriv wlan0 ftm 1");
-  run_tool(setup.channel_cmd);
-  run_tool("iwpriv wlan0 ena_chain 2");
-  run_tool(setup.rate_cmd);
-  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0"});
+  if (!power_is_off) power_value = static_cast<int>(std::atof(power_text.text) * 100);
+  if (!wide) sleep_ms(200);
+  run_sh_commands({"iwpriv wlan0 ftm 1", setup.channel_cmd, "iwpriv wlan0 ena_chain 2",
+                   setup.rate_cmd, "iwpriv wlan0 pwr_cntl_mode 2"});
   if (power_is_off) {
     char value[kCommandSize];
     if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
-    std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_txpower %d", std::atoi(value));
+    power_value = std::atoi(value);
   }
-  run_tool(power_cmd);
-  run_tool("iwpriv wlan0 tx 1");
+  run_sh_command("iwpriv wlan0 set_txpower %d", power_value);
+  run_sh_command("iwpriv wlan0 tx 1");
   return RESULT_OK;
 }
 
@@ -271,31 +246,25 @@ int wlan_receive(const char* cmdline, bool wide) {
   const std::string_view channel = fields.next();
   const std::string_view rate = fields.next();
   const std::string_view bonding = wide ? fields.next() : std::string_view();
-  if (channel.empty() || rate.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (channel.empty() || rate.empty()) return LOGGED_ERROR("Parameters incomplete.");
   RfSetup setup;
   if (!rf_setup(channel, rate, bonding, wide, setup)) return RESULT_ERROR;
-  run_tool("iwpriv wlan0 ftm 1");
+  run_sh_command("iwpriv wlan0 ftm 1");
   if (wide) ::sleep(1);
-  run_tool(setup.channel_cmd);
-  run_tool("iwpriv wlan0 ena_chain 1");
-  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
+  run_sh_commands({setup.channel_cmd, "iwpriv wlan0 ena_chain 1", "iwpriv wlan0 pwr_cntl_mode 2"});
   ATCI_LOGD("rate_cmd=%s, !!BUT AT NOT SET!!", setup.rate_cmd);
-  run_tool("iwpriv wlan0 clr_rxpktcnt 1");
-  run_tool("iwpriv wlan0 rx 1");
+  run_sh_commands({"iwpriv wlan0 clr_rxpktcnt 1", "iwpriv wlan0 rx 1"});
   return RESULT_OK;
 }
 
 int wlan_packet_count(char* response) {
-  ::usleep(500 * 1000);
-  run_tool("iwpriv wlan0 get_rxpktcnt > /data/wlanRxPER");
+  sleep_ms(500);
   char value[kCommandSize];
-  if (!read_driver_value("/data/wlanRxPER", 100, "===the pckcnt is NULL\r\n", value))
+  if (!read_driver_value("iwpriv wlan0 get_rxpktcnt", "/data/wlanRxPER", 100,
+                         "===the pckcnt is NULL\r\n", value))
     return RESULT_ERROR;
   std::snprintf(response, RESPONSE_SIZE, "\"%ld\"", std::atol(value));
-  run_tool("iwpriv wlan0 clr_rxpktcnt 1");
+  run_sh_command("iwpriv wlan0 clr_rxpktcnt 1");
   return RESULT_OK;
 }
 
@@ -319,56 +288,33 @@ int wlan_set_power(const char* cmdline) {
   CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
   const std::string_view power = fields.next();
-  if (protocol.empty()) {
-    ATCI_LOGE("protocol null.");
-    return RESULT_ERROR;
-  }
+  if (protocol.empty()) return LOGGED_ERROR("protocol null.");
   const char* rate_cmd = protocol_rate(protocol);
-  if (rate_cmd == nullptr) {
-    ATCI_LOGE("protocl wrong.");
-    return RESULT_ERROR;
-  }
-  if (power.empty()) {
-    ATCI_LOGE("Parameters incomplete %c.", std::tolower(static_cast<unsigned char>(protocol[0])));
-    return RESULT_ERROR;
-  }
+  if (rate_cmd == nullptr) return LOGGED_ERROR("protocl wrong.");
+  if (power.empty())
+    return LOGGED_ERROR("Parameters incomplete %c.",
+                        std::tolower(static_cast<unsigned char>(protocol[0])));
   const double value = std::atof(FieldText(power).text);
   if (!(value >= 5 && value <= 20)) {
     ATCI_LOGE("power=%d,not in [5,20]", static_cast<int>(value));
     if (matches("N", protocol)) ATCI_LOGE("AT+JVWLAN=SP,N,power");
     return RESULT_ERROR;
   }
-  run_tool("iwpriv wlan0 tx 0");
-  run_tool("iwpriv wlan0 ftm 0");
-  char power_cmd[kCommandSize];
-  std::snprintf(power_cmd, sizeof power_cmd, "iwpriv wlan0 set_chpower %d",
-                static_cast<int>(value * 100));
-  run_tool("iwpriv wlan0 ftm 1");
-  run_tool("iwpriv wlan0 set_channel 1");
-  run_tool("iwpriv wlan0 ena_chain 2");
-  run_tool(rate_cmd);
-  run_tool("iwpriv wlan0 pwr_cntl_mode 2");
-  run_tool(power_cmd);
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0", "iwpriv wlan0 ftm 1",
+                   "iwpriv wlan0 set_channel 1", "iwpriv wlan0 ena_chain 2", rate_cmd,
+                   "iwpriv wlan0 pwr_cntl_mode 2"});
+  run_sh_command("iwpriv wlan0 set_chpower %d", static_cast<int>(value * 100));
   return RESULT_OK;
 }
 
 int wlan_get_power(const char* cmdline, char* response) {
   CommaFields fields(cmdline);
   const std::string_view protocol = fields.next();
-  if (protocol.empty()) {
-    ATCI_LOGE("Parameters incomplete.");
-    return RESULT_ERROR;
-  }
+  if (protocol.empty()) return LOGGED_ERROR("Parameters incomplete.");
   const char* rate_cmd = protocol_rate(protocol);
-  if (rate_cmd == nullptr) {
-    ATCI_LOGE("temp solution,20120311 just support BGN protocol");
-    return RESULT_ERROR;
-  }
-  run_tool("iwpriv wlan0 tx 0");
-  run_tool("iwpriv wlan0 ftm 0");
-  run_tool("iwpriv wlan0 ftm 1");
-  run_tool("iwpriv wlan0 set_channel 1");
-  run_tool(rate_cmd);
+  if (rate_cmd == nullptr) return LOGGED_ERROR("temp solution,20120311 just support BGN protocol");
+  run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 ftm 0", "iwpriv wlan0 ftm 1",
+                   "iwpriv wlan0 set_channel 1", rate_cmd});
   char value[kCommandSize];
   if (!read_tx_power("===the default_power is NULL\r\n", value)) return RESULT_ERROR;
   std::snprintf(response, RESPONSE_SIZE, "\r\n\"%f\"\r\n", std::atof(value) / 100);
@@ -377,22 +323,19 @@ int wlan_get_power(const char* cmdline, char* response) {
 
 int wlan_set_config(const char* cmdline) {
   killprocess("ptt_socket_app", 1);
-  run_tool("ptt_socket_app");
+  run_sh_command("ptt_socket_app");
   CommaFields fields(cmdline);
   const std::string_view value = fields.next();
-  if (value.empty()) {
-    ATCI_LOGE("Parameters configItem1 incomplete.");
-    return RESULT_ERROR;
-  }
-  runf("iwpriv wlan0 set_configitem %d", std::atoi(FieldText(value).text));
+  if (value.empty()) return LOGGED_ERROR("Parameters configItem1 incomplete.");
+  run_sh_command("iwpriv wlan0 set_configitem %d", std::atoi(FieldText(value).text));
   return RESULT_OK;
 }
 
 int wlan_get_config(char* response) {
-  run_tool("iwpriv wlan0 ftm 1");
-  run_tool("iwpriv wlan0 get_configitem > /data/wlanTxPower");
+  run_sh_command("iwpriv wlan0 ftm 1");
   char value[kCommandSize];
-  if (!read_driver_value(kTxPowerFile, 50, "===the configItem1 is NULL\r\n", value))
+  if (!read_driver_value("iwpriv wlan0 get_configitem", kTxPowerFile, 50,
+                         "===the configItem1 is NULL\r\n", value))
     return RESULT_ERROR;
   return answer_quoted_int(response, std::atoi(value));
 }
@@ -421,32 +364,29 @@ int wifi_handler(char* cmdline, int, char* response) {
   if (line_starts_with(cmdline, "AT+JVWLAN=5")) return wlan_receive(cmdline, true);
   if (line_starts_with(cmdline, "AT+JVWLAN=6")) return wlan_packet_count(response);
   if (line_is(cmdline, "AT+JVWLAN=7")) {
-    run_tool("iwpriv wlan0 tx 0");
+    run_sh_command("iwpriv wlan0 tx 0");
     ATCI_LOGD("wifi_stop_tx called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=8")) {
-    run_tool("iwpriv wlan0 rx 0");
-    run_tool("iwpriv wlan0 ftm 0");
+    run_sh_commands({"iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0"});
     ATCI_LOGD("wifi_stop_rx called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=9")) {
-    for (const char* command :
-         {"iwpriv wlan0 tx 0", "iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0", "rmmod cfg80211",
-          "rmmod wlan", "echo 0 > /sys/module/wcnsscore/parameters/wlan_eng_mode"})
-      run_tool(command);
+    run_sh_commands({"iwpriv wlan0 tx 0", "iwpriv wlan0 rx 0", "iwpriv wlan0 ftm 0",
+                     "rmmod cfg80211", "rmmod wlan",
+                     "echo 0 > /sys/module/wcnsscore/parameters/wlan_eng_mode"});
     ATCI_LOGD("wifi_deinit called");
     return RESULT_OK;
   }
   if (line_is(cmdline, "AT+JVWLAN=10")) {
-    run_tool("iwpriv wlan0 clr_rxpktcnt 1");
+    run_sh_command("iwpriv wlan0 clr_rxpktcnt 1");
     return RESULT_OK;
   }
   if (line_starts_with(cmdline, "AT+JVWLAN=SP")) return wlan_set_power(cmdline);
   if (line_starts_with(cmdline, "AT+JVWLAN=GP")) return wlan_get_power(cmdline, response);
   if (line_starts_with(cmdline, "AT+JVWLAN=SC")) return wlan_set_config(cmdline);
   if (line_starts_with(cmdline, "AT+JVWLAN=GC")) return wlan_get_config(response);
-  ATCI_LOGE("=====this at command invalid=====");
-  return RESULT_ERROR;
+  return LOGGED_ERROR("=====this at command invalid=====");
 }
