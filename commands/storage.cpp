@@ -3,6 +3,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <fcntl.h>
 #include <string_view>
 #include <strings.h>
 #include <sys/stat.h>
@@ -101,12 +102,15 @@ bool keeps_inside(const keep_list& keep, std::string_view relative) {
 }
 
 // ---- Walking without following links ----
+// The walk opens the card by its device path, as opendir would (the card itself may be a link),
+// and reaches everything below it relative to the directory it stands in, by name, never
+// through a link: a link is an entry like a file, removed and never followed.
 
 enum class EntryKind { kDirectory, kRegular, kLink, kOther, kGone };
 
-// The directory entry describes the entry itself, never a link's target; lstat answers when
-// the file system does not say.
-EntryKind entry_kind(const dirent* entry, const char* path) {
+// The directory entry describes the entry itself, never a link's target; fstatat without
+// following answers when the file system does not say.
+EntryKind entry_kind(int dir_fd, const dirent* entry) {
   switch (entry->d_type) {
     case DT_DIR: return EntryKind::kDirectory;
     case DT_REG: return EntryKind::kRegular;
@@ -115,85 +119,114 @@ EntryKind entry_kind(const dirent* entry, const char* path) {
     default: return EntryKind::kOther;
   }
   struct stat st {};
-  if (dev_lstat(path, &st) != 0) return EntryKind::kGone;
+  if (::fstatat(dir_fd, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) != 0) return EntryKind::kGone;
   if (S_ISDIR(st.st_mode)) return EntryKind::kDirectory;
   if (S_ISREG(st.st_mode)) return EntryKind::kRegular;
   if (S_ISLNK(st.st_mode)) return EntryKind::kLink;
   return EntryKind::kOther;
 }
 
-// Opens a directory found in a walk, only if it is still that directory and not a link that
-// replaced it since (opening follows links).
-UniqueDir open_walked_dir(const char* path) {
-  struct stat seen {};
-  struct stat opened {};
-  if (dev_lstat(path, &seen) != 0 || !S_ISDIR(seen.st_mode)) {
-    errno = ENOTDIR;
-    return nullptr;
-  }
-  UniqueDir dir(dev_opendir(path));
-  if (!dir) return nullptr;
-  if (::fstat(::dirfd(dir.get()), &opened) != 0 || opened.st_dev != seen.st_dev ||
-      opened.st_ino != seen.st_ino) {
-    errno = ELOOP;
-    return nullptr;
-  }
+// Opens the directory `name` of `parent` only if it is one itself: a link that took its place
+// since the directory was read is refused, not followed.
+UniqueDir open_subdir(int parent, const char* name) {
+  UniqueFd fd(::openat(parent, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  if (!fd.ok()) return nullptr;
+  UniqueDir dir(::fdopendir(fd.get()));
+  if (dir) fd.release();
   return dir;
 }
 
-// Calls visit(path, kind) for every entry of `dir` but "." and "..", with the full path
-// "dir_path/name". An entry whose path does not fit is skipped rather than cut: a cut path
-// would name another file.
+// The full path of the entry the walk stands on, for keep-list matching and messages. One
+// buffer serves the whole walk: each level appends its entry's name and cuts it off again.
+struct WalkPath {
+  char text[kPathSize];
+  size_t length;
+
+  explicit WalkPath(const char* start) : length(std::strlen(start)) {
+    std::memcpy(text, start, length + 1);
+  }
+  const char* relative() const { return text + kRootPrefixLength; }
+  std::string_view relative_view() const {
+    return {text + kRootPrefixLength, length - kRootPrefixLength};
+  }
+};
+
+// Calls visit(dir_fd, name, kind) for every entry of `dir` but "." and "..", with `path` set to
+// "path/name" meanwhile. An entry whose path does not fit is skipped rather than cut: a cut
+// path would name another file.
 template <typename Visit>
-void for_each_entry(DIR* dir, const char* dir_path, Visit&& visit) {
-  char path[kPathSize];
+void for_each_entry(DIR* dir, WalkPath& path, Visit&& visit) {
+  const int fd = ::dirfd(dir);
+  const size_t base = path.length;
   while (const dirent* entry = ::readdir(dir)) {
-    if (std::strcmp(entry->d_name, ".") == 0 || std::strcmp(entry->d_name, "..") == 0) continue;
-    const int length = std::snprintf(path, sizeof path, "%s/%s", dir_path, entry->d_name);
-    if (length < 0 || static_cast<size_t>(length) >= sizeof path) {
-      ATCI_LOGW("path too long, skipped: %s/%s", dir_path, entry->d_name);
+    const char* name = entry->d_name;
+    if (name[0] == '.' && (name[1] == '\0' || (name[1] == '.' && name[2] == '\0'))) continue;
+    const size_t name_length = std::strlen(name);
+    if (base + 1 + name_length >= kPathSize) {
+      ATCI_LOGW("path too long, skipped: %s/%s", path.text, name);
       continue;
     }
-    visit(static_cast<const char*>(path), entry_kind(entry, path));
+    path.text[base] = '/';
+    std::memcpy(path.text + base + 1, name, name_length + 1);
+    path.length = base + 1 + name_length;
+    visit(fd, static_cast<const char*>(name), entry_kind(fd, entry));
+    path.text[base] = '\0';
+    path.length = base;
   }
 }
 
-// Removes regular files and links, descends into directories, then removes the directory.
-// Other entries stay, and so does the directory that holds them.
-void delete_recursively(const char* path) {
-  UniqueDir dir(open_walked_dir(path));
+// Removes regular files and links, descends into directories, then removes the directory
+// `name` of `parent` (`path` names it). Other entries stay, and so does the directory that
+// holds them.
+void delete_recursively(int parent, const char* name, WalkPath& path) {
+  UniqueDir dir(open_subdir(parent, name));
   if (!dir) {
-    std::printf("Fail to read %s : %s\r\n", path, std::strerror(errno));
+    std::printf("Fail to read %s : %s\r\n", path.text, std::strerror(errno));
     return;
   }
-  for_each_entry(dir.get(), path, [](const char* entry, EntryKind kind) {
+  for_each_entry(dir.get(), path, [&path](int fd, const char* entry, EntryKind kind) {
     if (kind == EntryKind::kRegular || kind == EntryKind::kLink)
-      dev_unlink(entry);
+      ::unlinkat(fd, entry, 0);
     else if (kind == EntryKind::kDirectory)
-      delete_recursively(entry);
+      delete_recursively(fd, entry, path);
   });
   dir.reset();
-  dev_rmdir(path);
+  ::unlinkat(parent, name, AT_REMOVEDIR);
 }
 
-void clean_directory(DIR* dir, const char* path, const keep_list& keep) {
-  for_each_entry(dir, path, [&keep](const char* entry, EntryKind kind) {
-    const char* relative = entry + kRootPrefixLength;
+void clean_directory(DIR* dir, WalkPath& path, const keep_list& keep) {
+  for_each_entry(dir, path, [&path, &keep](int fd, const char* name, EntryKind kind) {
     if (kind == EntryKind::kGone) return;
     if (kind != EntryKind::kDirectory) {
-      if (!keeps_file(keep, relative)) dev_unlink(entry);
+      if (!keeps_file(keep, path.relative())) ::unlinkat(fd, name, 0);
       return;
     }
     // A directory kept whole wins over a kept path inside it, whatever their order.
-    if (keeps_dir_exactly(keep, relative)) return;
-    if (!keeps_inside(keep, relative)) {
-      delete_recursively(entry);
+    if (keeps_dir_exactly(keep, path.relative())) return;
+    if (!keeps_inside(keep, path.relative_view())) {
+      delete_recursively(fd, name, path);
       return;
     }
-    if (UniqueDir inner = open_walked_dir(entry))
-      clean_directory(inner.get(), entry, keep);
+    if (UniqueDir inner = open_subdir(fd, name))
+      clean_directory(inner.get(), path, keep);
     else
-      ATCI_LOGE("cannot open %s: %s", entry, std::strerror(errno));
+      ATCI_LOGE("cannot open %s: %s", path.text, std::strerror(errno));
+  });
+}
+
+// Counts what lies below the directory `dir` (`path` names it).
+void count_below(DIR* dir, WalkPath& path, int* dirs, int* files) {
+  for_each_entry(dir, path, [&](int fd, const char* name, EntryKind kind) {
+    if (kind == EntryKind::kGone) return;
+    if (kind != EntryKind::kDirectory) {
+      ++*files;
+      return;
+    }
+    ++*dirs;
+    if (UniqueDir inner = open_subdir(fd, name))
+      count_below(inner.get(), path, dirs, files);
+    else
+      ATCI_LOGE("cannot open %s: %s", path.text, std::strerror(errno));
   });
 }
 
@@ -266,25 +299,25 @@ int clear_sdcard(const char* mode) {
     ATCI_LOGE("cannot open %s: %s", SDCARD_ROOT, std::strerror(errno));
     return 1;
   }
-  clean_directory(root.get(), SDCARD_ROOT, clear_sdcard_keep);
+  WalkPath path(SDCARD_ROOT);
+  clean_directory(root.get(), path, clear_sdcard_keep);
   return 1;
 }
 
 void traversal_directory(const char* path, int* dirs, int* files) {
-  UniqueDir dir(open_walked_dir(path));
+  UniqueDir dir;
+  if (std::strlen(path) < kPathSize) {
+    UniqueFd fd(dev_open(path, O_RDONLY | O_DIRECTORY | O_NOFOLLOW));
+    if (fd.ok() && (dir = UniqueDir(::fdopendir(fd.get())))) fd.release();
+  } else {
+    errno = ENAMETOOLONG;
+  }
   if (!dir) {
     ATCI_LOGE("cannot open %s: %s", path, std::strerror(errno));
     return;
   }
-  for_each_entry(dir.get(), path, [dirs, files](const char* entry, EntryKind kind) {
-    if (kind == EntryKind::kGone) return;
-    if (kind != EntryKind::kDirectory) {
-      ++*files;
-      return;
-    }
-    ++*dirs;
-    traversal_directory(entry, dirs, files);
-  });
+  WalkPath walked(path);
+  count_below(dir.get(), walked, dirs, files);
 }
 
 int tfst_handler(char* cmdline, int, char* response) {
@@ -368,14 +401,17 @@ int jvfn_handler(char* cmdline, int, char* response) {
   int files = 0;
   bool clean = true;
   if (UniqueDir root{dev_opendir(SDCARD_ROOT)}) {
-    for_each_entry(root.get(), SDCARD_ROOT, [&](const char* entry, EntryKind kind) {
-      const char* name = entry + kRootPrefixLength;
+    WalkPath path(SDCARD_ROOT);
+    for_each_entry(root.get(), path, [&](int fd, const char* name, EntryKind kind) {
       if (kind == EntryKind::kGone) return;
       if (kind != EntryKind::kDirectory) {
-        if (keeps_file(jvfn_keep, name)) ++files;
+        if (keeps_file(jvfn_keep, path.relative())) ++files;
         if (strncasecmp(name, "oem_", 4) == 0) clean = false;
-      } else if (keeps_dir_exactly(jvfn_keep, name)) {
-        traversal_directory(entry, &dirs, &files);
+      } else if (keeps_dir_exactly(jvfn_keep, path.relative())) {
+        if (UniqueDir inner = open_subdir(fd, name))
+          count_below(inner.get(), path, &dirs, &files);
+        else
+          ATCI_LOGE("cannot open %s: %s", path.text, std::strerror(errno));
         ++dirs;
       }
     });
