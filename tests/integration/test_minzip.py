@@ -3,6 +3,7 @@ import os
 import random
 import struct
 import subprocess
+import warnings
 import zipfile
 from pathlib import Path
 
@@ -134,6 +135,56 @@ def test_directory_of_megabytes_out_of_order_with_duplicates(tmp_path):
         assert Extracted(archive, name).data == str(index).encode(), name
 
 
+def _ordered_names(order):
+    """Names of 1 to 4,095 bytes, so long names cross any reading boundary."""
+    rng = random.Random(order)
+    names = sorted({"n/" + "".join(rng.choice("abcXYZ019 -_.~") for _ in range(rng.choice((1, 30, 900, 4093))))
+                    for _ in range(150)})
+    if order == "ascending":
+        return names[:40] + [names[40]] * 3 + names[41:]  # duplicates side by side
+    if order == "descending":
+        return names[::-1]
+    if order == "descending_but_one":  # one pair out of order sends it to the sort
+        return names[::-1][:100] + [names[0]] + names[::-1][100:]
+    rng.shuffle(names)
+    return names + names[:2]
+
+
+@pytest.mark.parametrize("order", ["ascending", "descending", "descending_but_one", "random"])
+def test_any_order_of_names_lists_sorted_and_finds_the_first(tmp_path, order):
+    names = _ordered_names(order)
+    archive = tmp_path / "ordered.zip"
+    with warnings.catch_warnings():
+        warnings.simplefilter("ignore")
+        write_zip(archive, [(n, f"{i}:{n[:20]}".encode(), DEFLATED if i % 2 else STORED)
+                            for i, n in enumerate(names)])
+    first = {}
+    for i, name in enumerate(names):
+        first.setdefault(name, i)
+    got = listing(archive)
+    assert got.returncode == 0
+    lines = got.stdout.decode().splitlines()
+    repeats = sorted((n for i, n in enumerate(names) if first[n] != i))
+    assert lines[:len(repeats)] == [f"minzip: WARNING: duplicate entry '{n}' in Zip" for n in repeats]
+    listed = [line.split(" ", 8)[8] for line in lines[len(repeats):]]
+    assert listed == sorted(names, key=str.encode)
+    # Equal names keep the directory's order: the first one written is listed, and found, first.
+    layout = Layout(archive.read_bytes())
+    offsets = [int(line.split(" ", 8)[7]) for line in lines[len(repeats):]]
+    by_name = sorted(range(len(names)), key=lambda i: (names[i].encode(), i))
+    assert offsets == [layout.data_offset(archive.read_bytes(), i) for i in by_name]
+    for name in (names[0], names[-1], *rng_sample(names, 12, order)):
+        got = Extracted(archive, name)
+        assert (got.returncode, got.data) == (0, f"{first[name]}:{name[:20]}".encode()), name[:40]
+    for miss in (names[0] + "~", names[0][:-1], "m"):
+        if miss not in first:
+            assert Extracted(archive, miss).returncode == 1
+
+
+def rng_sample(names, count, seed):
+    return random.Random(seed).sample(names, count)
+
+
 def test_duplicate_names_keep_the_first(tmp_path):
     archive = tmp_path / "dup.zip"
     with pytest.warns(UserWarning):
@@ -184,8 +235,9 @@ def _bad_open_cases(tmp_path):
         ("data past the end", patch(data, cd0 + CD_CSIZE, "<I", size),
          f"minzip: Data ran off the end (at {cd0})\n"),
     ]
-    for char, octal in ((b"\x7f", "177"), (b"\x1f", "037"), (b"\xc3", "303")):
-        bad = data.replace(b"second.bin", b"second" + char + b"bin")
+    for char, octal, bad_name in ((b"\x7f", "177", b"second\x7fbin"), (b"\x1f", "037", b"second\x1fbin"),
+                                  (b"\xc3", "303", b"second\xc3bin"), (b"\x01", "001", b"second.bi\x01")):
+        bad = data.replace(b"second.bin", bad_name)
         cases.append((f"name byte {octal}", bad,
                       f"minzip: Filename contains invalid character '{octal}'\n"
                       f"minzip: Invalid filename (at {cd1})\n"))
