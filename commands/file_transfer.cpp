@@ -97,12 +97,39 @@ struct StreamDecoder {
   }
 };
 
+// Decoded bytes wait here and go to the file in large writes: one write a line would cost the
+// receive more than its decoding.
+class FileWriter {
+ public:
+  explicit FileWriter(int fd) : fd_(fd) {}
+  // Room for one chunk's bytes at the end of what is waiting.
+  uint8_t* room() {
+    if (sizeof pending_ - used_ < kChunkBytes && !flush()) return nullptr;
+    return pending_ + used_;
+  }
+  void add(size_t n) { used_ += n; }
+  // False, and logged, when a write was short.
+  bool flush() {
+    if (used_ > 0 && ::write(fd_, pending_, used_) != static_cast<ssize_t>(used_)) {
+      ATCI_LOGE("write file error:%s ", std::strerror(errno));
+      return false;
+    }
+    used_ = 0;
+    return true;
+  }
+
+ private:
+  int fd_;
+  size_t used_ = 0;
+  uint8_t pending_[64 * 1024];
+};
+
 // Reads the content into `fd` until `remaining` bytes arrived (more are kept, as stations
 // have always seen). False when the port fails or a write is short.
 bool receive_content(int fd, long long remaining) {
   StreamDecoder decoder;
+  FileWriter file(fd);
   char chunk[kChunkChars + 1];
-  uint8_t bytes[kChunkBytes];
   while (remaining > 0) {
     const PortRead read = read_port_data(chunk, kChunkChars);
     ATCI_LOGD("receive_len=%d", read.count);
@@ -111,23 +138,19 @@ bool receive_content(int fd, long long remaining) {
       ATCI_LOGE("write file error:%s ", std::strerror(errno));
       return false;
     }
-    size_t n;
-    if (read.stream) {
-      n = decoder.decode(chunk, count, bytes);
-    } else if (count == 1) {
+    if (!read.stream && count == 1) {
       ATCI_LOGD("readDataFromSerial: %0x, %s", chunk[0], "drop");
       continue;
-    } else {
-      n = decode_line(chunk, count, bytes);
     }
+    uint8_t* bytes = file.room();
+    if (bytes == nullptr) return false;
+    const size_t n =
+        read.stream ? decoder.decode(chunk, count, bytes) : decode_line(chunk, count, bytes);
+    file.add(n);
     remaining -= static_cast<long long>(n);
     ATCI_LOGD("total_len=%lld", remaining);
-    if (n > 0 && ::write(fd, bytes, n) != static_cast<ssize_t>(n)) {
-      ATCI_LOGE("write file error:%s ", std::strerror(errno));
-      return false;
-    }
   }
-  return true;
+  return file.flush();
 }
 
 // The stored file changes only once the whole content is written and synced; a transfer cut
