@@ -207,12 +207,16 @@ RESTART_PAUSE = 0.05
 RESTART_PAUSE_FAILED = 1.0
 
 
-def run_service(binary, root, log_path, port=None, listen=None, on_start=None, stopping=None):
+def run_service(binary, root, log_path, port=None, listen=None, on_start=None, stopping=None,
+                on_power=None):
     """Runs the daemon on `root` as the phone's init runs its service: whenever it ends on its
     own it is started again on the same root, so a station can hang up and connect again.
     Returns the last status once the daemon ended by a power request (.emu/power.log grew
-    while it ran) or once `stopping` (a threading.Event) is set. `on_start` gets each process."""
+    while it ran) or once `stopping` (a threading.Event) is set. `on_start` gets each process;
+    `on_power` is told "serving" at each start, "restarting" between two runs and "off" at
+    the end."""
     stopping = stopping or threading.Event()
+    power = on_power or (lambda state: None)
     while True:
         before = power_log_size(root)
         started = time.monotonic()
@@ -220,13 +224,17 @@ def run_service(binary, root, log_path, port=None, listen=None, on_start=None, s
             proc = start_daemon(binary, root, port=port, log=log, listen=listen)
         if on_start is not None:
             on_start(proc)
+        power("serving")
         if stopping.is_set():
             proc.terminate()
         status = proc.wait()
         if stopping.is_set() or power_log_size(root) > before:
+            power("off")
             return status
+        power("restarting")
         pause = RESTART_PAUSE if status == 0 else RESTART_PAUSE_FAILED
         if stopping.wait(max(0.0, pause - (time.monotonic() - started))):
+            power("off")
             return status
 
 
