@@ -88,13 +88,14 @@ def chromium(user_data):
 
 
 def launcher_url(launcher):
-    deadline = time.monotonic() + PATIENCE
+    printed, deadline = b"", time.monotonic() + PATIENCE
     while time.monotonic() < deadline:
         if select.select([launcher.stdout], [], [], 0.1)[0]:
-            line = launcher.stdout.readline()
-            if "live view" in line:
-                return line.split()[-1]
-    raise AssertionError("the launcher printed no live view")
+            printed += os.read(launcher.stdout.fileno(), 4096)
+            for line in printed.decode().splitlines(keepends=True):
+                if "live view" in line and line.endswith("\n"):
+                    return line.split()[-1]
+    raise AssertionError(f"the launcher printed no live view: {printed}")
 
 
 @pytest.mark.skipif(bool(MISSING), reason=f"no browser to test the page in: {MISSING} missing "
@@ -108,7 +109,7 @@ def test_page_in_browser(device_root, tmp_path):
     launcher = subprocess.Popen(
         [sys.executable, str(SOURCE / "emulator/atcid-emu"), "--root", str(device_root), "--keep",
          "--port", str(port), "--view-port", str(free_port()), "--bin", str(BINARY)],
-        stdout=subprocess.PIPE, text=True)
+        stdout=subprocess.PIPE)
     driver = station = None
     try:
         url = launcher_url(launcher)
