@@ -541,7 +541,7 @@ CONTROLS = (
     Control("modem.gps", "GPS text", "Modem", Text(515, single_line=False),
             Exact(".emu/modem/gps/2"), "what the GPS stream sends, exactly"),
     Control("modem.absent", "Service absent", "Modem", ON_OFF, Presence(".emu/modem/absent"),
-            "takes effect when the daemon starts again"),
+            "the next modem request waits for good; back on, the daemon must start again"),
     Control("modem.transport_error", "Transport error", "Modem", INT32,
             Switch(".emu/modem/transport_error"), "fails every request so; 0: off"),
     Control("modem.response_error", "Error answer", "Modem", INT32,

@@ -538,7 +538,8 @@ class LiveView:
             items.update(values)
         entries = []
         if log_changed:
-            log_items, entries = self._log.read()
+            with self._lock:  # the dialogue is read by the HTTP threads
+                log_items, entries = self._log.read()
             items.update(log_items)
         self._publish(items, entries)
 
@@ -567,6 +568,7 @@ class LiveView:
 class Handler(BaseHTTPRequestHandler):
     server_version = "atcid-live-view"
     protocol_version = "HTTP/1.0"
+    timeout = 60  # for a request to arrive; an event stream waits on its queue, not here
 
     def log_message(self, *_):
         pass
@@ -603,7 +605,8 @@ class Handler(BaseHTTPRequestHandler):
         if self.headers.get("Content-Type", "").split(";")[0].strip() != "application/json":
             self._send(415, {"error": "send the control as application/json"})
             return
-        length = int(self.headers.get("Content-Length") or 0)
+        length = self.headers.get("Content-Length", "")
+        length = int(length) if length.isdigit() else 0
         if not 0 < length <= 65536:
             self._send(400, {"error": "a JSON body of at most 64 KiB is needed"})
             return

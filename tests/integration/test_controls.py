@@ -24,6 +24,7 @@ EFFECTS = [
     ("sim.1", "1", b"AT+JVSIM=1", b"", b"OK"),
     ("sim.1", "0", b"AT+JVSIM=1", b"", b"ERROR"),
     ("sensor.gsensor", "1 -2.4 9.6", b"AT+JVZLJC=0,3", b'"1,-2,10"\r\n', b"OK"),
+    ("sensor.proximity", "123", b"AT+JVHWKJ=2", b'"123,0"\r\n', b"OK"),
     ("sensor.proximity.state", "away", b"AT+JVHWKJ=3", b"", b"ERROR"),
     ("sensor.hall", "1", b"AT+JVHALL=1", b"", b"ERROR"),
     ("headset", "0", b"AT+JVFM=3", b"", b"ERROR"),
@@ -33,6 +34,7 @@ EFFECTS = [
     ("modem.transport_error", "1", b"AT+EGMR=0,5", b"", b"ERROR"),
     ("modem.transport_error", "0", b"AT+EGMR=0,5", b"PCB0001", b"OK"),
     ("prop.ro.product.model", "QM0101", b"AT+JVMODEL=0", b'\r\n"QM0101"\r\n', b"OK"),
+    ("modem.absent", "1", b"AT+JVHALL=1", b"", b"ERROR"),  # the modem's requests would wait
 ]
 
 
@@ -40,7 +42,9 @@ def test_each_control_changes_the_next_answer(tcp_phone):
     wrong = []
     for name, value, command, body, word in EFFECTS:
         if name:
-            controls.set_control(tcp_phone.root, name, value)
+            stored = controls.set_control(tcp_phone.root, name, value)
+            if controls.find(name).read(tcp_phone.root) != stored:
+                wrong.append((name, value, "reads back", controls.find(name).read(tcp_phone.root)))
         answer = tcp_phone.command(command)
         if answer != framed_tcp(command, body, word):
             wrong.append((name, value, command, answer.replace(b"\0", b"")))
