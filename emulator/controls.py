@@ -53,26 +53,32 @@ def _split(rel):
     return parts[:-1], parts[-1]
 
 
-def _read(root, rel, limit, tail):
+def _at(root, rel, action, failed=None):
+    """action(directory descriptor, name) on a path of the root; `failed` when that fails."""
     dirs, name = _split(rel)
     try:
         dfd = _open_dir(root, dirs)
     except OSError:
-        return None
+        return failed
     try:
+        return action(dfd, name)
+    except OSError:
+        return failed
+    finally:
+        os.close(dfd)
+
+
+def _read(root, rel, limit, tail):
+    def read(dfd, name):
         fd = os.open(name, os.O_RDONLY | os.O_NOFOLLOW | os.O_CLOEXEC | os.O_NONBLOCK, dir_fd=dfd)
         try:
             start = max(0, os.fstat(fd).st_size - limit) if tail else 0
             data = os.pread(fd, limit, start)
         finally:
             os.close(fd)
-    except OSError:
-        return None
-    finally:
-        os.close(dfd)
-    if start > 0:
-        data = data[data.find(b"\n") + 1:]
-    return data.decode("utf-8", "replace")
+        # A tail begins at its first whole line.
+        return (data[data.find(b"\n") + 1:] if start > 0 else data).decode("utf-8", "replace")
+    return _at(root, rel, read)
 
 
 def read_file(root, rel, limit=4096):
@@ -85,34 +91,17 @@ def read_tail(root, rel, limit=65536):
     return _read(root, rel, limit, tail=True)
 
 
+def _lstat(dfd, name):
+    return os.stat(name, dir_fd=dfd, follow_symlinks=False)
+
+
 def modified(root, rel):
     """The file's modification time (seconds since the epoch), or None."""
-    dirs, name = _split(rel)
-    try:
-        dfd = _open_dir(root, dirs)
-    except OSError:
-        return None
-    try:
-        return os.stat(name, dir_fd=dfd, follow_symlinks=False).st_mtime
-    except OSError:
-        return None
-    finally:
-        os.close(dfd)
+    return _at(root, rel, lambda dfd, name: _lstat(dfd, name).st_mtime)
 
 
 def exists(root, rel):
-    dirs, name = _split(rel)
-    try:
-        dfd = _open_dir(root, dirs)
-    except OSError:
-        return False
-    try:
-        os.stat(name, dir_fd=dfd, follow_symlinks=False)
-        return True
-    except OSError:
-        return False
-    finally:
-        os.close(dfd)
+    return _at(root, rel, lambda dfd, name: bool(_lstat(dfd, name)), False)
 
 
 def write_file(root, rel, text):
@@ -280,12 +269,15 @@ ON_OFF = Choice((("1", "yes"), ("0", "no")))
 # --- Stores: where a control's value lives and how it is written ------------------------------
 
 @dataclass(frozen=True)
-class Node:
-    """A kernel node: the value and a line end, as the template's nodes hold them."""
+class OneFile:
     path: str
 
     def files(self):
         return (self.path,)
+
+
+class Node(OneFile):
+    """A kernel node: the value and a line end, as the template's nodes hold them."""
 
     def read(self, root):
         return first_line(read_file(root, self.path))
@@ -294,13 +286,8 @@ class Node:
         write_file(root, self.path, value + "\n")
 
 
-@dataclass(frozen=True)
-class Exact:
+class Exact(OneFile):
     """A text the daemon takes exactly as stored, line ends and all."""
-    path: str
-
-    def files(self):
-        return (self.path,)
 
     def read(self, root):
         return read_file(root, self.path, 1024) or ""
@@ -309,41 +296,30 @@ class Exact:
         write_file(root, self.path, value)
 
 
-@dataclass(frozen=True)
-class Switch:
+class Switch(Node):
     """A number file that is off when missing: 0 removes it."""
-    path: str
-
-    def files(self):
-        return (self.path,)
 
     def read(self, root):
-        return first_line(read_file(root, self.path)) or "0"
+        return super().read(root) or "0"
 
     def write(self, root, value):
         if value == "0":
             remove_file(root, self.path)
         else:
-            write_file(root, self.path, value + "\n")
+            super().write(root, value)
 
 
-@dataclass(frozen=True)
-class Presence:
+class Presence(OneFile):
     """A file whose being there is the state."""
-    path: str
-
-    def files(self):
-        return (self.path,)
 
     def read(self, root):
         return "1" if exists(root, self.path) else "0"
 
     def write(self, root, value):
-        if value == "1":
-            if not exists(root, self.path):
-                write_file(root, self.path, "")
-        else:
+        if value == "0":
             remove_file(root, self.path)
+        elif not exists(root, self.path):
+            write_file(root, self.path, "")
 
 
 @dataclass(frozen=True)
@@ -434,7 +410,6 @@ class MemoryCard:
             move(root, CARD, CARD_REMOVED)
 
 
-@dataclass(frozen=True)
 class UsbCable(Node):
     """The charger follows the cable, as the kernel's battery status does: pulled, a charging
     battery discharges; plugged in, it charges (Full at 100 %)."""

@@ -17,7 +17,7 @@ import urllib.request
 import pytest
 
 import live_view
-from conftest import BINARY, PATIENCE, SOURCE, free_port
+from conftest import BINARY, PATIENCE, QEMU_USER, SOURCE, free_port
 
 sys.path.insert(0, str(SOURCE / "station"))
 from atcid_station import Station  # noqa: E402
@@ -66,6 +66,35 @@ def test_http_interface(device_root):
         view.close()
     assert not any(thread.is_alive() for thread in view._threads)
     assert events.read().strip() == b""  # the stream ended with the view
+
+
+# What the view makes of the daemon's log and logs, after each command (in order, one phone).
+READS = [
+    (b"AT+EADC=1", {"stream.battery": "on",
+                    "stream.battery.last": '+EADC: "3.85,25.00,0.58,450.00,4.50"'}),
+    (b"AT+EADC=0", {"stream.battery": "off"}),
+    (b"AT+JVSP=0", {"wakelock": "held"}),
+    (b"AT+JVXL=1", {"audio.path": "loudspeaker playback"}),
+    (b"AT+JVXL=0", {"audio.path": "none"}),
+    (b"AT+LCMT=0", {} if QEMU_USER else {"screen": "com.ulda.engineermode/.ATLcmTest"}),
+    (b"AT+JVZLJC=0,1", {"stream.gsensor": "on", "stream.gsensor.last": "10"}),
+]
+
+
+def test_view_reads_the_daemon(tcp_phone):
+    view = live_view.LiveView(tcp_phone.root, tcp_phone.log_path, "127.0.0.1", 0)
+    view.start()
+    try:
+        for command, items in READS:
+            tcp_phone.command(command)
+            deadline = time.monotonic() + PATIENCE
+            while not items.items() <= view.state()["items"].items():
+                assert time.monotonic() < deadline, (command, items, view.state()["items"])
+                time.sleep(0.02)
+        dialogue = [(e["line"], e["answer"]) for e in view.state()["dialogue"]]
+        assert dialogue[:3] == [("AT+EADC=1", "OK"), ("AT+EADC=0", "OK"), ("AT+JVSP=0", "OK")]
+    finally:
+        view.close()
 
 
 BROWSER = ("/usr/bin/chromium", "/usr/bin/chromedriver")
