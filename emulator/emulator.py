@@ -224,9 +224,9 @@ def run_service(binary, root, log_path, port=None, listen=None, on_start=None, s
             proc = start_daemon(binary, root, port=port, log=log, listen=listen)
         if on_start is not None:
             on_start(proc)
+        power("serving")
         if stopping.is_set():
             proc.terminate()
-        power("serving")
         status = proc.wait()
         if stopping.is_set() or power_log_size(root) > before:
             power("off")

@@ -202,8 +202,8 @@ def last_power_request(root):
 
 def main(args, binary, make_view=None):
     """The launcher with --count: prints one line per phone, serves until every phone powered
-    off or Ctrl-C. `make_view(phone)` may give each phone a live view (an object with start(),
-    url, set_power(state) and close()); it then follows the phone's power state."""
+    off or Ctrl-C. `make_view(phone)` may give each phone a started live view (an object with
+    url, set_power(state) and close(), or None); it then follows the phone's power state."""
     out = threading.Lock()
 
     def say(text):
@@ -235,8 +235,8 @@ def main(args, binary, make_view=None):
             else "kept root, identity as it holds it")
         if make_view is not None:
             phone.view = make_view(phone)
-            phone.view.start()
-            line += f"  view {phone.view.url}"
+            if phone.view is not None:
+                line += f"  view {phone.view.url}"
         say(line)
 
     signal.signal(signal.SIGTERM, lambda *_: fleet.stop())
