@@ -164,7 +164,7 @@ def test_page_in_browser(device_root, tmp_path):
         driver.find_element(By.CSS_SELECTOR, '[data-item="usb.cable"] input').click()
         shown("battery.capacity", "15")
         shown("usb.cable", "0")
-        assert station.ask("AT+JVDLJ=1").value() == "3.85,15%"
+        assert station.ask("AT+JVDLJ=1").value == "3.85,15%"
         assert station.ask("AT+JVCHARGE=0").result == "ERROR"  # no cable, no charging
         WebDriverWait(driver, PATIENCE).until(lambda d: ["AT+JVCHARGE=0", "ERROR"] in [
             [cell.text for cell in row.find_elements(By.TAG_NAME, "td")][1:3]
