@@ -1,92 +1,56 @@
 #include "commands/factory_flags.h"
 
-#include <gtest/gtest.h>
-
-#include <chrono>
 #include <atomic>
-#include <string>
+#include <chrono>
 #include <thread>
 
 #include "tests/unit/handler_call.h"
-#include "tests/unit/record_fixture.h"
+#include "tests/unit/handler_case.h"
+#include "tests/unit/worker_port.h"
 
 namespace {
 
-struct FlagCase {
-  const char* name;
-  CommandHandler handler;
-  std::string line;
-  const char* property;  // "name=value", or null
-  RecordTest::Change before, after;  // no `after`: the record stays as it was
-  int status;
-  std::string body;
+constexpr int OK = RESULT_OK;
+constexpr int ERR = RESULT_ERROR;
+const std::string kBootanim = "prop:init.svc.bootanim";
+const std::string kBooted = "prop:sys.boot_completed";
+
+const HandlerCase kRows[] = {
+    {"sn_ok", jvcn_handler, "AT+JVCN=0", {{kBootanim, "stopped"}, {kBooted, "1"}}, OK, "", {}, {}, nullptr,
+     [](ulda_nvram& r) { r.is_jvsn_ok = 1; }},
+    {"sn_before_boot", jvcn_handler, "AT+JVCN=0", {{kBootanim, "stopped"}, {kBooted, "0"}}, ERR, ""},
+    {"wallpaper", jvmmiui_handler, "AT+JVMMIUI=1,12", {}, OK, "", {}, {}, nullptr,
+     [](ulda_nvram& r) { r.wallpaper_id = 12; }},
+    {"wallpaper_not_digits", jvmmiui_handler, "AT+JVMMIUI=1,12A", {}, ERR, ""},
+    {"wallpaper_read", jvmmiui_handler, "AT+JVMMIUI=0", {}, OK, "\r\n\"7\"\r\n", {}, {},
+     [](ulda_nvram& r) { r.wallpaper_id = 7; }},
+    {"root", jvroot_handler, "AT+JVROOT=0", {}, OK, "", {}, {{"prop:persist.sys.is_root", "0"}}, nullptr,
+     [](ulda_nvram& r) { r.is_root = 0; }},
+    {"3g", jv3g_handler, "AT+JV3G=1,5", {}, OK, "", {}, {}, nullptr, [](ulda_nvram& r) { r.nomal_3g = 5; }},
+    {"3g_unset_is_0", jv3g_handler, "AT+JV3G=0", {}, OK, "\r\n\"0\"\r\n", {}, {}, [](ulda_nvram& r) { r.nomal_3g = 0; }},
+    {"3g_differs", jv3g_handler, "AT+JV3G=0", {{"prop:sys.pemu.3g.nomal", "2"}}, ERR, "", {}, {},
+     [](ulda_nvram& r) { r.nomal_3g = 3; }},
+    {"feature", jvfeature_handler, "AT+JVFEATURE=1,4", {}, OK, "", {}, {}, [](ulda_nvram& r) { r.special_feature = 16; },
+     [](ulda_nvram& r) { r.special_feature = 20; }},
+    {"feature_read", jvfeature_handler, "AT+JVFEATURE=0,6", {}, OK, "\r\n\"4\"\r\n", {}, {},
+     [](ulda_nvram& r) { r.special_feature = 20; }},
+    {"order", jvtestmmi_handler, "AT+JVTESTMMI=1,ABC", {}, OK, "", {}, {}, nullptr,
+     [](ulda_nvram& r) { set_ulda_string(r.test_order, "ABC"); }},
+    {"order_cut", jvtestmmi_handler, "AT+JVTESTMMI=1," + std::string(150, 'O'), {}, OK, "", {}, {}, nullptr,
+     [](ulda_nvram& r) { std::memset(r.test_order, 'O', 100); }},
+    {"order_unreadable", jvtestmmi_handler, "AT+JVTESTMMI=1,X", {{"/persist/ulda_nvram", "short"}}, ERR, ""},
+    // Only the test order leaves the station without an answer when the write fails.
+    {"order_unwritable", jvtestmmi_handler, "AT+JVTESTMMI=1,X", {{"/persist/ulda_nvram.tmp/x", ""}}, RESULT_DONE, ""},
+    {"log_switch_read", jvqlog_handler, "AT+JVQLOG=1,3", {{"prop:persist.sys.is_kro_log", "2"}}, OK, "\"2\"\r\n"},
+    {"wizard_old_rom", jvsyjm_handler, "AT+JVSYJM=1", {{"prop:ro.pemu.rom.version", "ROM_1.5"}}, ERR, ""},
 };
-void PrintTo(const FlagCase& c, std::ostream* os) { *os << c.name; }
 
-const FlagCase kFlagCases[] = {
-    {"sn_ok", jvcn_handler, "AT+JVCN=0", nullptr, nullptr, [](ulda_nvram& r) { r.is_jvsn_ok = 1; }, RESULT_OK, ""},
-    {"wallpaper", jvmmiui_handler, "AT+JVMMIUI=1,12", nullptr, nullptr, [](ulda_nvram& r) { r.wallpaper_id = 12; }, RESULT_OK, ""},
-    {"wallpaper_not_digits", jvmmiui_handler, "AT+JVMMIUI=1,12a", nullptr, nullptr, nullptr, RESULT_ERROR, ""},
-    {"wallpaper_read", jvmmiui_handler, "AT+JVMMIUI=0", nullptr, [](ulda_nvram& r) { r.wallpaper_id = 7; }, nullptr, RESULT_OK, "\r\n\"7\"\r\n"},
-    {"root", jvroot_handler, "AT+JVROOT=0", nullptr, nullptr, [](ulda_nvram& r) { r.is_root = 0; }, RESULT_OK, ""},
-    {"3g", jv3g_handler, "AT+JV3G=1,5", nullptr, nullptr, [](ulda_nvram& r) { r.nomal_3g = 5; }, RESULT_OK, ""},
-    {"3g_unset_is_0", jv3g_handler, "AT+JV3G=0", nullptr, [](ulda_nvram& r) { r.nomal_3g = 0; }, nullptr, RESULT_OK, "\r\n\"0\"\r\n"},
-    {"3g_differs", jv3g_handler, "AT+JV3G=0", "sys.pemu.3g.nomal=2", [](ulda_nvram& r) { r.nomal_3g = 3; }, nullptr, RESULT_ERROR, ""},
-    {"feature", jvfeature_handler, "AT+JVFEATURE=1,4", nullptr, [](ulda_nvram& r) { r.special_feature = 16; }, [](ulda_nvram& r) { r.special_feature = 20; }, RESULT_OK, ""},
-    {"feature_read", jvfeature_handler, "AT+JVFEATURE=0,6", nullptr, [](ulda_nvram& r) { r.special_feature = 20; }, nullptr, RESULT_OK, "\r\n\"4\"\r\n"},
-    {"order", jvtestmmi_handler, "AT+JVTESTMMI=1,ABC", nullptr, nullptr, [](ulda_nvram& r) { set_ulda_string(r.test_order, "ABC"); }, RESULT_OK, ""},
-    {"order_cut", jvtestmmi_handler, "AT+JVTESTMMI=1," + std::string(150, 'O'), nullptr, nullptr, [](ulda_nvram& r) { std::memset(r.test_order, 'O', 100); }, RESULT_OK, ""},
-    {"order_missing", jvtestmmi_handler, "AT+JVTESTMMI=1", nullptr, nullptr, nullptr, RESULT_ERROR, ""},
-    {"log_switch_read", jvqlog_handler, "AT+JVQLOG=1,3", "persist.sys.is_kro_log=2", nullptr, nullptr, RESULT_OK, "\"2\"\r\n"},
-    {"wizard_old_rom", jvsyjm_handler, "AT+JVSYJM=1", "ro.pemu.rom.version=ROM_1.5", nullptr, nullptr, RESULT_ERROR, ""},
-};
-
-class FactoryFlags : public RecordTest, public ::testing::WithParamInterface<FlagCase> {};
-
-TEST_P(FactoryFlags, ChangesOnlyItsField) {
-  const FlagCase& c = GetParam();
-  set_property("init.svc.bootanim", "stopped");
-  set_property("sys.boot_completed", "1");
-  if (c.property) {
-    const std::string p = c.property;
-    set_property(p.substr(0, p.find('=')), p.substr(p.find('=') + 1));
-  }
-  put_record(patterned(c.before));
-  const HandlerAnswer answer = call_handler(c.handler, c.line);
-  EXPECT_EQ(answer.status, c.status);
-  EXPECT_EQ(answer.body, c.body);
-  ulda_nvram expected = patterned(c.before);
-  if (c.after) c.after(expected);
-  EXPECT_EQ(record_bytes(), bytes_of(expected));
-}
-
-INSTANTIATE_TEST_SUITE_P(Lines, FactoryFlags, ::testing::ValuesIn(kFlagCases),
-                         [](const auto& info) { return std::string(info.param.name); });
+INSTANTIATE_TEST_SUITE_P(FactoryFlags, HandlerTable, ::testing::ValuesIn(kRows), case_name);
 
 class FactoryFlagsTest : public RecordTest {};
 
-TEST_F(FactoryFlagsTest, RecordFailures) {
-  set_property("sys.boot_completed", "0");
-  EXPECT_EQ(call_handler(jvcn_handler, "AT+JVCN=0").status, RESULT_ERROR);
-  EXPECT_EQ(record_bytes(), bytes_of(patterned()));
-  write_file("/persist/ulda_nvram", "short");
-  EXPECT_EQ(call_handler(jvroot_handler, "AT+JVROOT=0").status, RESULT_ERROR);
-  EXPECT_EQ(get_property("persist.sys.is_root"), "");
-  // Only the test order leaves the station without an answer when the write fails.
-  EXPECT_EQ(call_handler(jvtestmmi_handler, "AT+JVTESTMMI=1,X").status, RESULT_ERROR);
-  put_record(patterned());
-  break_record_writes();
-  EXPECT_EQ(call_handler(jvtestmmi_handler, "AT+JVTESTMMI=1,X").status, RESULT_DONE);
-  EXPECT_EQ(call_handler(jvmmiui_handler, "AT+JVMMIUI=1,3").status, RESULT_ERROR);
-  EXPECT_EQ(record_bytes(), bytes_of(patterned()));
-}
-
-TEST_F(FactoryFlagsTest, EfsGoldenCopyNeedsTheAnswerZero) {
-  EXPECT_EQ(call_handler(jvefs_handler, "AT+JVEFS=1").status, RESULT_OK);
-  write_file("/.emu/modem/efs_golden_copy", "3");
-  EXPECT_EQ(call_handler(jvefs_handler, "AT+JVEFS=1").status, RESULT_ERROR);
-  // The "0" an earlier answer left must not pass a request that was never sent.
-  std::filesystem::remove(host_path("/.emu/modem/efs_golden_copy"));
+// A request that was never sent must not pass on the "0" an earlier answer left.
+TEST_F(FactoryFlagsTest, EfsGoldenCopyNeedsAnAnswer) {
   EXPECT_EQ(call_handler(jvefs_handler, "AT+JVEFS=1").status, RESULT_OK);
   write_file("/.emu/modem/send_error", "5");
   EXPECT_EQ(call_handler(jvefs_handler, "AT+JVEFS=1").status, RESULT_ERROR);
@@ -101,15 +65,13 @@ TEST_F(FactoryFlagsTest, OneIntegrityCheckAtATime) {
     return 0;
   };
   EXPECT_EQ(call_handler(jvkj_handler, "AT+JVKJ=1").status, RESULT_OK);
-  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(60);
-  while (entered == 0 && std::chrono::steady_clock::now() < deadline)
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  const bool started = wait_until([&] { return entered > 0; });
   EXPECT_EQ(call_handler(jvkj_handler, "AT+JVKJ=1").status, RESULT_OK);  // starts none
   release = true;
-  while (root_integrity_check_running && std::chrono::steady_clock::now() < deadline)
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));
-  ASSERT_FALSE(root_integrity_check_running);
-  EXPECT_EQ(entered, 2);  // the two commands of one check
+  ASSERT_TRUE(started);
+  ASSERT_TRUE(wait_until([] { return !root_integrity_check_running && running_workers() == 0; }));
+  EXPECT_EQ(shell_commands(), (Lines{"/system/bin/sh -c \"richk > data/rooIntegityCheck.txt\"",
+                                     "/system/bin/sh -c \"chmod 666 /data/rooIntegityCheck.txt\""}));
 }
 
 }  // namespace
