@@ -1,5 +1,6 @@
 #include "tests/unit/device_root.h"
 
+#include <cstdio>
 #include <cstdlib>
 #include <fstream>
 #include <sstream>
@@ -37,10 +38,16 @@ void DeviceRootTest::SetUp() {
   shell_commands().clear();
   shell_action() = nullptr;
   host_set_shell_hook(record_shell);
+  // A handler that powers the phone off or restarts it would end the test binary with status
+  // 0, which reads as a pass: the hook returns, and the platform aborts instead.
+  host_set_power_hook([](const char* what) {
+    std::fprintf(stderr, "unexpected power request in a unit test: %s\n", what);
+  });
 }
 
 void DeviceRootTest::TearDown() {
   host_set_shell_hook(nullptr);
+  host_set_power_hook(nullptr);
   shell_action() = nullptr;
   ::chdir("/");
   std::error_code ignored;
