@@ -1,5 +1,6 @@
 #include "minzip/zip_archive.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -159,12 +160,6 @@ ZipEntry* hash_insert(HashTable* table, ZipEntry* entry, uint32_t hash) {
 
 // ---- central directory ----
 
-[[noreturn]] void fatal_assert(const char* condition, const char* function, const char* file, int line) {
-  std::fflush(stdout);
-  std::fprintf(stderr, "%s:%d: %s: Assertion `%s' failed.\n", file, line, function, condition);
-  std::abort();
-}
-
 // Eight name bytes at a time: does any lie outside 0x20..0x7e?
 bool printable(const unsigned char* name, size_t length) {
   constexpr uint64_t kOnes = 0x0101010101010101;
@@ -209,38 +204,81 @@ int compare_names(const ZipEntry& a, const char* name, uint32_t length) {
   return a.name_length < length ? -1 : a.name_length > length ? 1 : 0;
 }
 
-// Opens a gap in the sorted array for `name` after any equal names, so the central directory
-// order survives among duplicates. Most archives list their names in order already: one
-// comparison with the last record settles those.
-// `hashes` runs parallel to the array and moves with it.
-ZipEntry* insert_sorted(ZipEntry* entries, uint32_t* hashes, unsigned int count, const char* name,
-                        uint32_t length) {
-  unsigned int low = 0;
-  unsigned int high = count;
-  if (count > 0 && compare_names(entries[count - 1], name, length) <= 0) low = count;
-  while (low < high) {
-    const unsigned int mid = low + (high - low) / 2;
-    if (compare_names(entries[mid], name, length) <= 0) {
-      low = mid + 1;
-    } else {
-      high = mid;
+int compare_names(const ZipEntry& a, const ZipEntry& b) { return compare_names(a, b.name, b.name_length); }
+
+// How the names come in the directory, told by one comparison of each name with the one before.
+struct NameOrder {
+  bool rising = true;   // no name below the one before it
+  bool falling = true;  // every name below the one before it
+};
+
+void note_order(NameOrder* order, const ZipEntry& previous, const ZipEntry& next) {
+  if (!order->rising && !order->falling) return;
+  const int c = compare_names(previous, next);
+  order->rising = order->rising && c <= 0;
+  order->falling = order->falling && c > 0;
+}
+
+// A stable merge sort of positions by name, the left run winning ties; returns whichever of the
+// two buffers holds the result.
+unsigned int* sort_positions(const ZipEntry* entries, unsigned int* from, unsigned int* to,
+                             unsigned int count) {
+  for (unsigned int i = 0; i < count; ++i) from[i] = i;
+  for (unsigned int width = 1; width < count; width *= 2) {
+    for (unsigned int low = 0; low < count; low += 2 * width) {
+      const unsigned int mid = std::min(low + width, count);
+      const unsigned int high = std::min(mid + width, count);
+      unsigned int i = low, j = mid, k = low;
+      while (i < mid && j < high) {
+        to[k++] = compare_names(entries[from[j]], entries[from[i]]) < 0 ? from[j++] : from[i++];
+      }
+      while (i < mid) to[k++] = from[i++];
+      while (j < high) to[k++] = from[j++];
     }
+    std::swap(from, to);
   }
-  const unsigned int target = low;
-  if (!(target <= count)) {
-    fatal_assert("target <= i", "parseZipArchive", "bootable/recovery/minzip/Zip", __LINE__);
+  return from;
+}
+
+// Puts the records, filed in directory order, in name order: the order that inserting each one
+// after any equal names would give, so equal names keep their directory order and the first of
+// them is the one found. Names in order need nothing, names in strictly falling order are
+// reversed; any other order is merge sorted by position and each record then moved once, along
+// the cycles of the permutation. `hashes` runs parallel to the records and moves with them.
+bool put_in_name_order(const NameOrder& order, ZipEntry* entries, uint32_t* hashes, unsigned int count) {
+  if (order.rising) return true;
+  if (order.falling) {
+    std::reverse(entries, entries + count);
+    std::reverse(hashes, hashes + count);
+    return true;
   }
-  if (target < count) {
-    std::memmove(&entries[target + 1], &entries[target], (count - target) * sizeof(ZipEntry));
-    std::memmove(&hashes[target + 1], &hashes[target], (count - target) * sizeof(uint32_t));
+  const std::unique_ptr<unsigned int, decltype(&std::free)> positions(
+      static_cast<unsigned int*>(std::malloc(size_t{count} * 2 * sizeof(unsigned int))), &std::free);
+  if (positions == nullptr) return false;
+  // source[i]: the directory position of the i-th name
+  unsigned int* source = sort_positions(entries, positions.get(), positions.get() + count, count);
+  for (unsigned int start = 0; start < count; ++start) {
+    if (source[start] == start) continue;
+    const ZipEntry entry = entries[start];
+    const uint32_t hash = hashes[start];
+    unsigned int at = start;
+    while (source[at] != start) {
+      const unsigned int next = source[at];
+      entries[at] = entries[next];
+      hashes[at] = hashes[next];
+      source[at] = at;
+      at = next;
+    }
+    entries[at] = entry;
+    hashes[at] = hash;
+    source[at] = at;
   }
-  hashes[target] = zip_name_hash(name, length);  // while the name is in the cache
-  return &entries[target];
+  return true;
 }
 
 // Fills one record from the central entry at `pos`; false (after saying why) on a bad entry.
-bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* slot_array,
-                         uint32_t* hashes, unsigned int filled, size_t* next) {
+bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* entry, uint32_t* hash,
+                         size_t* next) {
   const unsigned char* base = archive->addr;
   const size_t length = archive->length;
   const int at = static_cast<int>(pos);
@@ -268,8 +306,7 @@ bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* slot_a
   }
 
   const char* text = reinterpret_cast<const char*>(name);
-  ZipEntry* entry = insert_sorted(slot_array, hashes, filled, text, name_length);
-  *entry = ZipEntry{};
+  *hash = zip_name_hash(text, name_length);  // while the name is in the cache
   entry->name_length = name_length;
   entry->name = text;
   entry->compressed_size = get32(p + kCentralCompressedSize);
@@ -370,16 +407,21 @@ int parse_archive(ZipArchive* archive) {
   const std::unique_ptr<uint32_t, decltype(&std::free)> hashes(
       static_cast<uint32_t*>(std::malloc(count * sizeof(uint32_t))), &std::free);
   if (hashes == nullptr) return ENOMEM;
+  ZipEntry* entries = archive->entries;
+  uint32_t* name_hashes = hashes.get();
+  NameOrder order;
   size_t pos = directory;
   for (unsigned int i = 0; i < count; ++i) {
-    if (!parse_central_entry(archive, pos, archive->entries, hashes.get(), i, &pos)) return EINVAL;
+    if (!parse_central_entry(archive, pos, &entries[i], &name_hashes[i], &pos)) return EINVAL;
+    if (i > 0) note_order(&order, entries[i - 1], entries[i]);
     // The next local header is far from the directory: start fetching it now.
     if (pos + kCentralHeaderLength <= length) {
       const uint32_t local_offset = get32(base + pos + kCentralLocalOffset);
       if (local_offset < length) __builtin_prefetch(base + local_offset);
     }
   }
-  index_entries(archive, hashes.get());
+  if (!put_in_name_order(order, entries, name_hashes, count)) return ENOMEM;
+  index_entries(archive, name_hashes);
   return 0;
 }
 
