@@ -52,21 +52,20 @@ uint32_t get32(const unsigned char* p) {
 }
 
 // The entry array and the hash table run to megabytes for a large archive, and every page of
-// them is written while the directory is parsed. Such a block is made of whole 2 MiB-aligned
-// huge pages, made present in one call: that costs a fraction of a fault and a zeroed page per
-// 4 KiB. A kernel without transparent huge pages or page population still hands out zeroed
-// memory.
+// them is written while the directory is parsed. Such a block starts on a 2 MiB boundary, asks
+// for huge pages and is made present in one call: each whole 2 MiB of it costs a fraction of
+// the faults and zeroed pages of 4 KiB ones. It ends where the array does, so the tail past its
+// last whole huge page is ordinary pages and the block holds no memory it does not use. A
+// kernel without transparent huge pages or page population still hands out zeroed memory.
 constexpr size_t kHugePage = size_t{2} << 20;
 constexpr size_t kLargeBlock = size_t{1} << 20;
-
-// Whole huge pages: zeroing the rest of the last one costs less than faulting in its tail.
-size_t large_block_length(size_t bytes) { return (bytes + kHugePage - 1) & ~(kHugePage - 1); }
 
 void* zeroed_array(size_t count, size_t size) {
   if (count > SIZE_MAX / size) return nullptr;
   const size_t bytes = count * size;
   if (bytes < kLargeBlock) return std::calloc(count, size);
-  const size_t length = large_block_length(bytes);
+  const auto page = static_cast<size_t>(::sysconf(_SC_PAGESIZE));
+  const size_t length = (bytes + page - 1) / page * page;
   // Over-allocate by one huge page and trim both ends to the aligned block.
   void* area = ::mmap(nullptr, length + kHugePage, PROT_READ | PROT_WRITE,
                       MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
@@ -86,7 +85,7 @@ void free_array(void* block, size_t count, size_t size) {
   if (count * size < kLargeBlock) {
     std::free(block);
   } else {
-    ::munmap(block, large_block_length(count * size));
+    ::munmap(block, count * size);
   }
 }
 
