@@ -373,7 +373,28 @@ void index_entries(ZipArchive* archive, const uint32_t* hashes) {
   }
 }
 
-int parse_archive(ZipArchive* archive) {
+// The parse reads a file mapping in two passes at once, the directory and the local headers,
+// and reads neither stretch again (a name only for a sort or a lookup). Once a pass is a whole
+// step beyond what it has read, those pages are handed back: the mapping is private and never
+// written, so a page read again comes back from the file as it was, and a large archive does
+// not stay resident behind the parse. Each hand-back costs a flush of the address space's
+// translations, so it is done a megabyte at a time.
+constexpr size_t kReleaseStep = size_t{1} << 20;
+
+struct MappedPass {
+  unsigned char* base;  // null when the archive is not a file mapping
+  size_t released;      // pages below this offset were handed back
+};
+
+void pass_reaches(MappedPass* pass, size_t pos) {
+  if (pass->base == nullptr) return;
+  const size_t step_start = pos / kReleaseStep * kReleaseStep;
+  if (step_start < pass->released + kReleaseStep) return;
+  ::madvise(pass->base + pass->released, step_start - pass->released, MADV_DONTNEED);
+  pass->released = step_start;
+}
+
+int parse_archive(ZipArchive* archive, bool file_mapping) {
   const unsigned char* base = archive->addr;
   const size_t length = archive->length;
   if (length < kEndLength) return EINVAL;
@@ -409,10 +430,15 @@ int parse_archive(ZipArchive* archive) {
   ZipEntry* entries = archive->entries;
   uint32_t* name_hashes = hashes.get();
   NameOrder order;
+  auto* mapped = file_mapping ? const_cast<unsigned char*>(base) : nullptr;
+  MappedPass directory_pass{mapped, directory / kReleaseStep * kReleaseStep};
+  MappedPass header_pass{mapped, 0};
   size_t pos = directory;
   for (unsigned int i = 0; i < count; ++i) {
+    pass_reaches(&directory_pass, pos);
     if (!parse_central_entry(archive, pos, &entries[i], &name_hashes[i], &pos)) return EINVAL;
     if (i > 0) note_order(&order, entries[i - 1], entries[i]);
+    pass_reaches(&header_pass, entries[i].data_offset);
     // The next local header is far from the directory: start fetching it now.
     if (pos + kCentralHeaderLength <= length) {
       const uint32_t local_offset = get32(base + pos + kCentralLocalOffset);
@@ -528,7 +554,8 @@ int zip_open_archive(const MemMapping* map, ZipArchive* archive) {
   *archive = ZipArchive{};
   archive->addr = map->addr;
   archive->length = map->length;
-  const int err = parse_archive(archive);
+  // Pages of a mapping made by the file mapper can be handed back; a caller's own memory cannot.
+  const int err = parse_archive(archive, map->range_count > 0);
   if (err != 0) zip_close_archive(archive);
   return err;
 }
