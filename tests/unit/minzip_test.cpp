@@ -191,6 +191,18 @@ TEST_F(MinzipTest, ExtractionStaysInsideTheBuffer) {
   }
 }
 
+// The name hash is hash * 31 + byte from 2, whatever the length and the bytes.
+TEST(MinzipHash, EveryLengthAndByteAsTheOneByteRule) {
+  std::string name;
+  for (int length = 0; length <= 40; ++length) {
+    uint32_t expected = 2;
+    for (unsigned char c : name) expected = expected * 31 + c;
+    EXPECT_EQ(zip_name_hash(name.data(), name.size()), expected) << length;
+    name += static_cast<char>(0x20 + length * 37 % 0xe0);  // printable and high bytes
+  }
+  EXPECT_EQ(zip_name_hash("", 0), 2u);
+}
+
 // An archive in the caller's own memory is left as it was, however far the parse reads.
 TEST_F(MinzipTest, ArchiveInCallersMemoryIsReadWhole) {
   std::vector<ZipFile> files;
