@@ -203,6 +203,23 @@ TEST(MinzipHash, EveryLengthAndByteAsTheOneByteRule) {
   EXPECT_EQ(zip_name_hash("", 0), 2u);
 }
 
+// Names with the same hash share a probe sequence and are still told apart by their bytes.
+TEST(MinzipHash, NamesOfEqualHashAreBothFound) {
+  ASSERT_EQ(zip_name_hash("Aa", 2), zip_name_hash("BB", 2));
+  const std::string zip = build_zip({{"Aa", "first"}, {"BB", "second"}});
+  MemMapping map{reinterpret_cast<unsigned char*>(const_cast<char*>(zip.data())), zip.size(), nullptr, 0};
+  ZipArchive archive{};
+  testing::internal::CaptureStdout();
+  ASSERT_EQ(zip_open_archive(&map, &archive), 0);
+  EXPECT_EQ(testing::internal::GetCapturedStdout(), "");  // no duplicate
+  for (const char* name : {"Aa", "BB"}) {
+    const ZipEntry* entry = zip_find_entry(&archive, name);
+    ASSERT_NE(entry, nullptr) << name;
+    EXPECT_EQ(std::string(entry->name, entry->name_length), name);
+  }
+  zip_close_archive(&archive);
+}
+
 // An archive in the caller's own memory is left as it was, however far the parse reads.
 TEST_F(MinzipTest, ArchiveInCallersMemoryIsReadWhole) {
   std::vector<ZipFile> files;
