@@ -1,5 +1,8 @@
 #include "minzip/zip_archive.h"
 
+#include <algorithm>
+#include <array>
+#include <bit>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -50,22 +53,51 @@ uint32_t get32(const unsigned char* p) {
   return p[0] | p[1] << 8 | p[2] << 16 | static_cast<uint32_t>(p[3]) << 24;
 }
 
+// ---- name hash: hash * 31 + byte from 2, eight bytes a step ----
+
+constexpr std::array<uint32_t, 9> kPower31 = [] {
+  std::array<uint32_t, 9> powers{};
+  uint32_t power = 1;
+  for (uint32_t& p : powers) {
+    p = power;
+    power *= 31;
+  }
+  return powers;
+}();
+
+// Eight bytes in name order, the first in the low byte.
+uint64_t load_eight(const unsigned char* p) {
+  uint64_t w;
+  std::memcpy(&w, p, 8);
+  if constexpr (std::endian::native == std::endian::big) w = __builtin_bswap64(w);
+  return w;
+}
+
+// b0 * 31^7 + b1 * 31^6 + ... + b7, b0 the low byte of `w`: bytes to pairs, pairs to quads, in
+// one multiplication for all lanes each (no lane outgrows its width), then the two quads.
+uint32_t fold_eight(uint64_t w) {
+  constexpr uint64_t kEvenBytes = 0x00ff00ff00ff00ff;
+  constexpr uint64_t kEvenPairs = 0x0000ffff0000ffff;
+  const uint64_t pairs = (w & kEvenBytes) * kPower31[1] + (w >> 8 & kEvenBytes);
+  const uint64_t quads = (pairs & kEvenPairs) * kPower31[2] + (pairs >> 16 & kEvenPairs);
+  return static_cast<uint32_t>(quads) * kPower31[4] + static_cast<uint32_t>(quads >> 32);
+}
+
 // The entry array and the hash table run to megabytes for a large archive, and every page of
-// them is written while the directory is parsed. Such a block is made of whole 2 MiB-aligned
-// huge pages, made present in one call: that costs a fraction of a fault and a zeroed page per
-// 4 KiB. A kernel without transparent huge pages or page population still hands out zeroed
-// memory.
+// them is written while the directory is parsed. Such a block starts on a 2 MiB boundary, asks
+// for huge pages and is made present in one call: each whole 2 MiB of it costs a fraction of
+// the faults and zeroed pages of 4 KiB ones. It ends where the array does, so the tail past its
+// last whole huge page is ordinary pages and the block holds no memory it does not use. A
+// kernel without transparent huge pages or page population still hands out zeroed memory.
 constexpr size_t kHugePage = size_t{2} << 20;
 constexpr size_t kLargeBlock = size_t{1} << 20;
-
-// Whole huge pages: zeroing the rest of the last one costs less than faulting in its tail.
-size_t large_block_length(size_t bytes) { return (bytes + kHugePage - 1) & ~(kHugePage - 1); }
 
 void* zeroed_array(size_t count, size_t size) {
   if (count > SIZE_MAX / size) return nullptr;
   const size_t bytes = count * size;
   if (bytes < kLargeBlock) return std::calloc(count, size);
-  const size_t length = large_block_length(bytes);
+  const auto page = static_cast<size_t>(::sysconf(_SC_PAGESIZE));
+  const size_t length = (bytes + page - 1) / page * page;
   // Over-allocate by one huge page and trim both ends to the aligned block.
   void* area = ::mmap(nullptr, length + kHugePage, PROT_READ | PROT_WRITE,
                       MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
@@ -85,7 +117,7 @@ void free_array(void* block, size_t count, size_t size) {
   if (count * size < kLargeBlock) {
     std::free(block);
   } else {
-    ::munmap(block, large_block_length(count * size));
+    ::munmap(block, count * size);
   }
 }
 
@@ -159,12 +191,6 @@ ZipEntry* hash_insert(HashTable* table, ZipEntry* entry, uint32_t hash) {
 
 // ---- central directory ----
 
-[[noreturn]] void fatal_assert(const char* condition, const char* function, const char* file, int line) {
-  std::fflush(stdout);
-  std::fprintf(stderr, "%s:%d: %s: Assertion `%s' failed.\n", file, line, function, condition);
-  std::abort();
-}
-
 // Eight name bytes at a time: does any lie outside 0x20..0x7e?
 bool printable(const unsigned char* name, size_t length) {
   constexpr uint64_t kOnes = 0x0101010101010101;
@@ -209,38 +235,81 @@ int compare_names(const ZipEntry& a, const char* name, uint32_t length) {
   return a.name_length < length ? -1 : a.name_length > length ? 1 : 0;
 }
 
-// Opens a gap in the sorted array for `name` after any equal names, so the central directory
-// order survives among duplicates. Most archives list their names in order already: one
-// comparison with the last record settles those.
-// `hashes` runs parallel to the array and moves with it.
-ZipEntry* insert_sorted(ZipEntry* entries, uint32_t* hashes, unsigned int count, const char* name,
-                        uint32_t length) {
-  unsigned int low = 0;
-  unsigned int high = count;
-  if (count > 0 && compare_names(entries[count - 1], name, length) <= 0) low = count;
-  while (low < high) {
-    const unsigned int mid = low + (high - low) / 2;
-    if (compare_names(entries[mid], name, length) <= 0) {
-      low = mid + 1;
-    } else {
-      high = mid;
+int compare_names(const ZipEntry& a, const ZipEntry& b) { return compare_names(a, b.name, b.name_length); }
+
+// How the names come in the directory, told by one comparison of each name with the one before.
+struct NameOrder {
+  bool rising = true;   // no name below the one before it
+  bool falling = true;  // every name below the one before it
+};
+
+void note_order(NameOrder* order, const ZipEntry& previous, const ZipEntry& next) {
+  if (!order->rising && !order->falling) return;
+  const int c = compare_names(previous, next);
+  order->rising = order->rising && c <= 0;
+  order->falling = order->falling && c > 0;
+}
+
+// A stable merge sort of positions by name, the left run winning ties; returns whichever of the
+// two buffers holds the result.
+unsigned int* sort_positions(const ZipEntry* entries, unsigned int* from, unsigned int* to,
+                             unsigned int count) {
+  for (unsigned int i = 0; i < count; ++i) from[i] = i;
+  for (unsigned int width = 1; width < count; width *= 2) {
+    for (unsigned int low = 0; low < count; low += 2 * width) {
+      const unsigned int mid = std::min(low + width, count);
+      const unsigned int high = std::min(mid + width, count);
+      unsigned int i = low, j = mid, k = low;
+      while (i < mid && j < high) {
+        to[k++] = compare_names(entries[from[j]], entries[from[i]]) < 0 ? from[j++] : from[i++];
+      }
+      while (i < mid) to[k++] = from[i++];
+      while (j < high) to[k++] = from[j++];
     }
+    std::swap(from, to);
   }
-  const unsigned int target = low;
-  if (!(target <= count)) {
-    fatal_assert("target <= i", "parseZipArchive", "bootable/recovery/minzip/Zip", __LINE__);
+  return from;
+}
+
+// Puts the records, filed in directory order, in name order: the order that inserting each one
+// after any equal names would give, so equal names keep their directory order and the first of
+// them is the one found. Names in order need nothing, names in strictly falling order are
+// reversed; any other order is merge sorted by position and each record then moved once, along
+// the cycles of the permutation. `hashes` runs parallel to the records and moves with them.
+bool put_in_name_order(const NameOrder& order, ZipEntry* entries, uint32_t* hashes, unsigned int count) {
+  if (order.rising) return true;
+  if (order.falling) {
+    std::reverse(entries, entries + count);
+    std::reverse(hashes, hashes + count);
+    return true;
   }
-  if (target < count) {
-    std::memmove(&entries[target + 1], &entries[target], (count - target) * sizeof(ZipEntry));
-    std::memmove(&hashes[target + 1], &hashes[target], (count - target) * sizeof(uint32_t));
+  const std::unique_ptr<unsigned int, decltype(&std::free)> positions(
+      static_cast<unsigned int*>(std::malloc(size_t{count} * 2 * sizeof(unsigned int))), &std::free);
+  if (positions == nullptr) return false;
+  // source[i]: the directory position of the i-th name
+  unsigned int* source = sort_positions(entries, positions.get(), positions.get() + count, count);
+  for (unsigned int start = 0; start < count; ++start) {
+    if (source[start] == start) continue;
+    const ZipEntry entry = entries[start];
+    const uint32_t hash = hashes[start];
+    unsigned int at = start;
+    while (source[at] != start) {
+      const unsigned int next = source[at];
+      entries[at] = entries[next];
+      hashes[at] = hashes[next];
+      source[at] = at;
+      at = next;
+    }
+    entries[at] = entry;
+    hashes[at] = hash;
+    source[at] = at;
   }
-  hashes[target] = zip_name_hash(name, length);  // while the name is in the cache
-  return &entries[target];
+  return true;
 }
 
 // Fills one record from the central entry at `pos`; false (after saying why) on a bad entry.
-bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* slot_array,
-                         uint32_t* hashes, unsigned int filled, size_t* next) {
+bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* entry, uint32_t* hash,
+                         size_t* next) {
   const unsigned char* base = archive->addr;
   const size_t length = archive->length;
   const int at = static_cast<int>(pos);
@@ -268,8 +337,7 @@ bool parse_central_entry(const ZipArchive* archive, size_t pos, ZipEntry* slot_a
   }
 
   const char* text = reinterpret_cast<const char*>(name);
-  ZipEntry* entry = insert_sorted(slot_array, hashes, filled, text, name_length);
-  *entry = ZipEntry{};
+  *hash = zip_name_hash(text, name_length);  // while the name is in the cache
   entry->name_length = name_length;
   entry->name = text;
   entry->compressed_size = get32(p + kCentralCompressedSize);
@@ -337,7 +405,28 @@ void index_entries(ZipArchive* archive, const uint32_t* hashes) {
   }
 }
 
-int parse_archive(ZipArchive* archive) {
+// The parse reads a file mapping in two passes at once, the directory and the local headers,
+// and reads neither stretch again (a name only for a sort or a lookup). Once a pass is a whole
+// step beyond what it has read, those pages are handed back: the mapping is private and never
+// written, so a page read again comes back from the file as it was, and a large archive does
+// not stay resident behind the parse. Each hand-back costs a flush of the address space's
+// translations, so it is done a megabyte at a time.
+constexpr size_t kReleaseStep = size_t{1} << 20;
+
+struct MappedPass {
+  unsigned char* base;  // null when the archive is not a file mapping
+  size_t released;      // pages below this offset were handed back
+};
+
+void pass_reaches(MappedPass* pass, size_t pos) {
+  if (pass->base == nullptr) return;
+  const size_t step_start = pos / kReleaseStep * kReleaseStep;
+  if (step_start < pass->released + kReleaseStep) return;
+  ::madvise(pass->base + pass->released, step_start - pass->released, MADV_DONTNEED);
+  pass->released = step_start;
+}
+
+int parse_archive(ZipArchive* archive, bool file_mapping) {
   const unsigned char* base = archive->addr;
   const size_t length = archive->length;
   if (length < kEndLength) return EINVAL;
@@ -370,16 +459,26 @@ int parse_archive(ZipArchive* archive) {
   const std::unique_ptr<uint32_t, decltype(&std::free)> hashes(
       static_cast<uint32_t*>(std::malloc(count * sizeof(uint32_t))), &std::free);
   if (hashes == nullptr) return ENOMEM;
+  ZipEntry* entries = archive->entries;
+  uint32_t* name_hashes = hashes.get();
+  NameOrder order;
+  auto* mapped = file_mapping ? const_cast<unsigned char*>(base) : nullptr;
+  MappedPass directory_pass{mapped, directory / kReleaseStep * kReleaseStep};
+  MappedPass header_pass{mapped, 0};
   size_t pos = directory;
   for (unsigned int i = 0; i < count; ++i) {
-    if (!parse_central_entry(archive, pos, archive->entries, hashes.get(), i, &pos)) return EINVAL;
+    pass_reaches(&directory_pass, pos);
+    if (!parse_central_entry(archive, pos, &entries[i], &name_hashes[i], &pos)) return EINVAL;
+    if (i > 0) note_order(&order, entries[i - 1], entries[i]);
+    pass_reaches(&header_pass, entries[i].data_offset);
     // The next local header is far from the directory: start fetching it now.
     if (pos + kCentralHeaderLength <= length) {
       const uint32_t local_offset = get32(base + pos + kCentralLocalOffset);
       if (local_offset < length) __builtin_prefetch(base + local_offset);
     }
   }
-  index_entries(archive, hashes.get());
+  if (!put_in_name_order(order, entries, name_hashes, count)) return ENOMEM;
+  index_entries(archive, name_hashes);
   return 0;
 }
 
@@ -461,23 +560,15 @@ bool extract_to(const ZipArchive* archive, const ZipEntry* entry, CopyTarget* ta
 }  // namespace
 
 uint32_t zip_name_hash(const char* name, size_t length) {
-  // Eight steps of hash * 31 + byte at once: the products do not wait on each other.
-  constexpr auto power = [](int n) {
-    uint32_t p = 1;
-    for (int i = 0; i < n; ++i) p *= 31;
-    return p;
-  };
   const auto* p = reinterpret_cast<const unsigned char*>(name);
   uint32_t hash = 2;
   size_t i = 0;
-  for (; i + 8 <= length; i += 8) {
-    hash = hash * power(8) + p[i] * power(7) + p[i + 1] * power(6) + p[i + 2] * power(5) +
-           p[i + 3] * power(4) + p[i + 4] * power(3) + p[i + 5] * power(2) + p[i + 6] * 31u +
-           p[i + 7];
-  }
-  if (i + 4 <= length) {
-    hash = hash * power(4) + p[i] * power(3) + p[i + 1] * power(2) + p[i + 2] * 31u + p[i + 3];
-    i += 4;
+  for (; i + 8 <= length; i += 8) hash = hash * kPower31[8] + fold_eight(load_eight(p + i));
+  const size_t rest = length - i;
+  if (rest > 0 && length >= 8) {
+    // The last eight bytes with those already taken cleared: leading zeros add nothing.
+    const uint64_t last = load_eight(p + length - 8) & (~uint64_t{0} << (8 * (8 - rest)));
+    return hash * kPower31[rest] + fold_eight(last);
   }
   for (; i < length; ++i) hash = hash * 31 + p[i];
   return hash;
@@ -487,7 +578,8 @@ int zip_open_archive(const MemMapping* map, ZipArchive* archive) {
   *archive = ZipArchive{};
   archive->addr = map->addr;
   archive->length = map->length;
-  const int err = parse_archive(archive);
+  // Pages of a mapping made by the file mapper can be handed back; a caller's own memory cannot.
+  const int err = parse_archive(archive, map->range_count > 0);
   if (err != 0) zip_close_archive(archive);
   return err;
 }

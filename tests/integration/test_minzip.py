@@ -128,11 +128,15 @@ def _ordered_names(order):
         return names[::-1]
     if order == "descending_but_one":  # one pair out of order sends it to the sort
         return names[::-1][:100] + [names[0]] + names[::-1][100:]
+    if order == "descending_with_duplicates":  # equal names keep their order: no plain reversal
+        falling = names[::-1]
+        return falling[:60] + [falling[59]] * 2 + falling[60:]
     rng.shuffle(names)
     return names + names[:2]
 
 
-@pytest.mark.parametrize("order", ["ascending", "descending", "descending_but_one", "random"])
+@pytest.mark.parametrize("order", ["ascending", "descending", "descending_but_one",
+                                   "descending_with_duplicates", "random"])
 def test_any_order_of_names_lists_sorted_and_finds_the_first(tmp_path, order):
     names = _ordered_names(order)
     archive = tmp_path / "ordered.zip"

@@ -1,8 +1,11 @@
 #include <gtest/gtest.h>
 
+#include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <string>
 #include <vector>
+#include <unistd.h>
 #include <zlib.h>
 
 #include "minzip/file_mapper.h"
@@ -186,6 +189,60 @@ TEST_F(MinzipTest, ExtractionStaysInsideTheBuffer) {
     }
     zip_close_archive(&archive);
   }
+}
+
+// The name hash is hash * 31 + byte from 2, whatever the length and the bytes.
+TEST(MinzipHash, EveryLengthAndByteAsTheOneByteRule) {
+  std::string name;
+  for (int length = 0; length <= 40; ++length) {
+    uint32_t expected = 2;
+    for (unsigned char c : name) expected = expected * 31 + c;
+    EXPECT_EQ(zip_name_hash(name.data(), name.size()), expected) << length;
+    name += static_cast<char>(0x20 + length * 37 % 0xe0);  // printable and high bytes
+  }
+  EXPECT_EQ(zip_name_hash("", 0), 2u);
+}
+
+// Names with the same hash share a probe sequence and are still told apart by their bytes.
+TEST(MinzipHash, NamesOfEqualHashAreBothFound) {
+  ASSERT_EQ(zip_name_hash("Aa", 2), zip_name_hash("BB", 2));
+  const std::string zip = build_zip({{"Aa", "first"}, {"BB", "second"}});
+  MemMapping map{reinterpret_cast<unsigned char*>(const_cast<char*>(zip.data())), zip.size(), nullptr, 0};
+  ZipArchive archive{};
+  testing::internal::CaptureStdout();
+  ASSERT_EQ(zip_open_archive(&map, &archive), 0);
+  EXPECT_EQ(testing::internal::GetCapturedStdout(), "");  // no duplicate
+  for (const char* name : {"Aa", "BB"}) {
+    const ZipEntry* entry = zip_find_entry(&archive, name);
+    ASSERT_NE(entry, nullptr) << name;
+    EXPECT_EQ(std::string(entry->name, entry->name_length), name);
+  }
+  zip_close_archive(&archive);
+}
+
+// An archive in the caller's own memory is left as it was, however far the parse reads.
+TEST_F(MinzipTest, ArchiveInCallersMemoryIsReadWhole) {
+  std::vector<ZipFile> files;
+  for (char c : {'a', 'b', 'c'}) files.push_back({std::string(1, c), std::string(1536 * 1024, c)});
+  const std::string zip = build_zip(files);
+  // Page-aligned, as a mapping would be.
+  void* block = nullptr;
+  ASSERT_EQ(posix_memalign(&block, static_cast<size_t>(sysconf(_SC_PAGESIZE)), zip.size()), 0);
+  const std::unique_ptr<void, decltype(&std::free)> owner(block, &std::free);
+  auto* copy = static_cast<unsigned char*>(block);
+  std::memcpy(copy, zip.data(), zip.size());
+  MemMapping map{copy, zip.size(), nullptr, 0};
+  ZipArchive archive{};
+  ASSERT_EQ(zip_open_archive(&map, &archive), 0);
+  for (const ZipFile& f : files) {
+    const ZipEntry* entry = zip_find_entry(&archive, f.name.c_str());
+    ASSERT_NE(entry, nullptr);
+    std::vector<unsigned char> buffer(entry->uncompressed_size);
+    ASSERT_TRUE(zip_extract_entry_to_buffer(&archive, entry, buffer.data()));
+    EXPECT_EQ(std::string(buffer.begin(), buffer.end()), f.data);
+  }
+  zip_close_archive(&archive);
+  EXPECT_EQ(std::memcmp(copy, zip.data(), zip.size()), 0);
 }
 
 }  // namespace
