@@ -73,7 +73,9 @@ LogState& state() {
   return *log_state;
 }
 
-constexpr size_t kQueueLimit = size_t{1} << 20;  // beyond it the caller writes out itself
+// Beyond it the caller writes out itself. Small, so a writer kept off the CPU by a busy machine
+// lets the queue (and the daemon's memory) grow by no more than a few dozen commands' lines.
+constexpr size_t kQueueLimit = size_t{32} << 10;
 constexpr auto kGather = std::chrono::microseconds(500);
 
 void format_line(const Stamp& stamp, const char* tag, const char* text, size_t len) {
