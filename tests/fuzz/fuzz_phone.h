@@ -12,6 +12,7 @@
 #include <utility>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <mutex>
 #include <string>
 #include <string_view>
@@ -111,11 +112,9 @@ class Phone {
     for (const auto& e : fs::recursive_directory_iterator(outside_))
       listing += e.path().string() + "\n";
     if (listing != (outside_ / "precious").string() + "\n") fail("outside the root:", listing);
-    std::FILE* f = std::fopen((outside_ / "precious").c_str(), "rb");
-    char text[32] = {};
-    const size_t n = f ? std::fread(text, 1, sizeof text - 1, f) : 0;
-    if (f) std::fclose(f);
-    if (std::string_view(text, n) != "untouched") fail("outside the root: precious changed");
+    std::string text;
+    std::getline(std::ifstream(outside_ / "precious"), text);
+    if (text != "untouched") fail("outside the root: precious changed");
     std::error_code error;
     const auto size = fs::file_size(root_ / "persist/ulda_nvram", error);
     if (error || size != 536) fail("factory record size", std::to_string(error ? 0 : size));
@@ -123,10 +122,7 @@ class Phone {
 
  private:
   static void write(const fs::path& path, std::string_view text) {
-    std::FILE* f = std::fopen(path.c_str(), "wb");
-    if (f == nullptr) fail("cannot write", path.string());
-    std::fwrite(text.data(), 1, text.size(), f);
-    std::fclose(f);
+    if (!(std::ofstream(path, std::ios::binary) << text)) fail("cannot write", path.string());
   }
 
   void drain(int fd) {
